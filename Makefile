@@ -1,0 +1,58 @@
+# Two commands set up everything on a fresh Debian machine:
+#   make demo   builds the library and the tool and runs the main job
+#   make test   configures, builds and runs every test preset
+# Both install missing Debian packages first when run as root.
+
+PRESETS      ?= default asan armhf fuzz
+FUZZ_SECONDS ?= 300
+DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
+                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user
+
+.PHONY: all deps build test demo fuzz bench install clean $(addprefix test-,$(PRESETS))
+
+all: build
+
+deps:
+	@missing=""; for p in $(DEB_PACKAGES); do \
+	  dpkg-query -W -f='$${Status}' $$p 2>/dev/null | grep -q "install ok installed" || missing="$$missing $$p"; \
+	done; \
+	if [ -n "$$missing" ]; then \
+	  if [ "$$(id -u)" = 0 ]; then \
+	    echo "installing:$$missing"; \
+	    apt-get update -qq && DEBIAN_FRONTEND=noninteractive apt-get install -y -qq $$missing; \
+	  else \
+	    echo "missing Debian packages:$$missing (run as root or install them)"; exit 1; \
+	  fi; \
+	fi
+
+build: deps
+	cmake --preset default
+	cmake --build --preset default
+
+test: deps $(addprefix test-,$(PRESETS))
+
+test-%:
+	cmake --preset $*
+	cmake --build --preset $*
+	ctest --preset $*
+
+demo: build
+	./build/default/tools/lumicor_demo/lumicor_demo
+
+fuzz: deps
+	cmake --preset fuzz
+	cmake --build --preset fuzz
+	@for f in build/fuzz/fuzz_*; do \
+	  n=$${f##*/fuzz_}; mkdir -p build/fuzz/fuzz-work/$$n; \
+	  echo "== $$n ($(FUZZ_SECONDS) s)"; \
+	  $$f -max_total_time=$(FUZZ_SECONDS) -max_len=65536 build/fuzz/fuzz-work/$$n fuzz/corpus/$$n || exit 1; \
+	done
+
+bench: build
+	@for b in build/default/lumicor_bench build/default/bench_*; do [ -x $$b ] && $$b; done; true
+
+install: build
+	cmake --install build/default
+
+clean:
+	rm -rf build
