@@ -1,9 +1,7 @@
 #include <lumicor/lmk.h>
 
-#include <climits>
+#include <cstdint>
 #include <cstdio>
-#include <cstring>
-#include <new>
 
 #include "common/src/config/lmk_config_internal.h"
 #include "common/src/config/lmk_lock.h"
