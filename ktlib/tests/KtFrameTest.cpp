@@ -322,7 +322,7 @@ TEST(KtFrameTest, FuzzSeedsAreCurrentValidFrames) {
     lumicor::test::SampleRepresentative none(0, 0, 0), some(2, 3, 2), full(10, 4, 1);
     _KtMetaSimilarity zero;
     std::memset(&zero, 0, sizeof zero);
-    _KtMetaColorLabel blank = {}, full = {100, 100, 100, 100, 100, 100, {}};
+    _KtMetaColorLabel blank = {}, saturated = {100, 100, 100, 100, 100, 100, {}};
     const Bytes legacy = MakeFrame("REPM", 1, 0, 16, {255, 0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14});
     const struct {
         const char* dir;
@@ -331,7 +331,7 @@ TEST(KtFrameTest, FuzzSeedsAreCurrentValidFrames) {
         {"kt_siml_parse", {SimlFrame(lumicor::test::SampleSimilarity()), SimlFrame(zero, {1, 3}),
                            SimlFrame(lumicor::test::SampleSimilarity(), {2, 9})}},
         {"kt_repm_parse", {RepmFrame(none.meta), RepmFrame(some.meta), RepmFrame(full.meta), legacy}},
-        {"kt_clbl_parse", {ClblFrame(lumicor::test::SampleColorLabel()), ClblFrame(blank), ClblFrame(full)}},
+        {"kt_clbl_parse", {ClblFrame(lumicor::test::SampleColorLabel()), ClblFrame(blank), ClblFrame(saturated)}},
     };
     const bool write = std::getenv("LUMICOR_WRITE_FUZZ_SEEDS") != nullptr;
     for (const auto& s : seeds) {
