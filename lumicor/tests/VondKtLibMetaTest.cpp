@@ -69,11 +69,8 @@ TEST(VondKtLibMetaTest, SectionRoundTrip) {
     uint32_t written = 0;
     const _VondResult w = q.Serialize(buf, static_cast<uint32_t>(buf.size()), written);
     ASSERT_EQ(w.status, VOND_STATUS_OK);
-    EXPECT_STREQ(w.function, "VondKtLibSerialize");
-    EXPECT_EQ(w.message, nullptr);
     ASSERT_EQ(written, q.Size());
     EXPECT_EQ(buf[written], 0xAA);
-    EXPECT_EQ(0, std::memcmp(&buf[676 + 102], "CLBL", 4));
 
     Quality back;
     uint32_t consumed = 0;
@@ -91,7 +88,6 @@ TEST(VondKtLibMetaTest, SectionRoundTrip) {
 
     VondKtlibDisposeMeta(back.similarity, back.representative, back.colorLabel);
     EXPECT_EQ(back.representative.pFingers, nullptr);
-    EXPECT_EQ(back.representative.pBlurMap, nullptr);
     EXPECT_EQ(back.representative.numFinger, 0u);
 }
 
