@@ -16,11 +16,7 @@ using Bytes = std::vector<uint8_t>;
 constexpr uint16_t kBig = OFM_BYTE_ORDER_BIG;
 constexpr uint16_t kLittle = 0x4949;  // "II"
 
-template <typename T>
-T V(T v) {  // copies a packed member so gtest can bind it
-    return v;
-}
-
+using facemeta::V;
 uint32_t Get16(const Bytes& b, size_t at) { return (b[at] << 8) | b[at + 1]; }
 uint32_t Get32(const Bytes& b, size_t at) { return (Get16(b, at) << 16) | Get16(b, at + 2); }
 void Put16(Bytes& b, size_t at, uint32_t v) {

@@ -13,11 +13,7 @@ namespace {
 using facemeta::Owner;
 using Bytes = std::vector<uint8_t>;
 
-template <typename T>
-T V(T v) {  // copies a packed member so gtest can bind it
-    return v;
-}
-
+using facemeta::V;
 uint32_t Get32(const Bytes& b, size_t at) {
     return static_cast<uint32_t>(b[at]) << 24 | b[at + 1] << 16 | b[at + 2] << 8 | b[at + 3];
 }
