@@ -64,11 +64,16 @@ TEST(VondOrielMetaTest, SectionWithoutFacesIs102Bytes) {
     std::memset(static_cast<void*>(&meta), 0, sizeof meta);
     meta.formatVersion = OFM_FORMAT_VERSION_CURRENT;
     const _VondOrielMetaArray none = {0, nullptr};
+    meta.headerValue = 1.5f;
     Bytes b = Serialize(meta, 0, none);
     ASSERT_EQ(b.size(), 102u);
     EXPECT_EQ(Bytes(b.begin(), b.begin() + 8), Bytes(8, 0));
-    EXPECT_EQ(b[8], 'M');
-    EXPECT_EQ(b[9], 'M');
+    EXPECT_EQ(Get32(b, 8), 0x4D4D005Eu);
+    EXPECT_EQ(b[12] << 8 | b[13], 259);  // version
+    EXPECT_EQ(Get32(b, 8 + 72), 0x3FC00000u);  // headerValue
+    Bytes rest(b.begin() + 8 + 6, b.end());  // zero here but for headerValue: no date, bitmaps, E or F
+    rest[72 - 6] = rest[73 - 6] = 0;
+    EXPECT_EQ(rest, Bytes(rest.size(), 0));
 
     b.resize(130, 0xEE);  // the quality section follows
     Section s;
@@ -78,6 +83,7 @@ TEST(VondOrielMetaTest, SectionWithoutFacesIs102Bytes) {
     EXPECT_EQ(r.message, nullptr);
     EXPECT_EQ(s.consumed, 102u);
     EXPECT_EQ(V(s.meta.formatVersion), 259u);
+    EXPECT_EQ(V(s.meta.headerValue), 1.5f);
     EXPECT_EQ(V(s.meta.regionCount), 0u);
 }
 

@@ -86,31 +86,16 @@ inline void FillTwoFaces(Owner& o) {
 
     _FaceRegion& a = o[0];
     a.faceArea = zbm_Rect{100, 200, 300, 400};
-    a.auxBox[0] = 1;
-    a.auxBox[1] = 2;
-    a.auxBox[2] = 3;
-    a.auxBox[3] = 4;
-    a.rotation[0] = 0.25f;  // yaw
-    a.rotation[1] = -0.5f;  // pitch
-    a.rotation[2] = 1.0f;   // roll
-    a.auxWord = 0x01020304;
-    a.auxFlag = 5;
-    a.rightEye = zbm_Pos{150, 250};
-    a.leftEye = zbm_Pos{250, 251};
-    a.rightMouthEnd = zbm_Pos{160, 350};
-    a.leftMouthEnd = zbm_Pos{240, 351};
-    a.codeValid = 1;
-    a.codeFlag = 1;
-    a.code = 9;
-    a.orientation = 2;
-    a.flagsValid = 1;
-    a.flagA = 1;
-    a.statesValid = 1;
-    a.stateA = _FaceRegionState{1, 2};
-    a.stateB = _FaceRegionState{0, 1};
+    for (int i = 0; i < 4; ++i) a.auxBox[i] = i + 1;
+    a.rotation[0] = 0.25f, a.rotation[1] = -0.5f, a.rotation[2] = 1.0f;  // yaw, pitch, roll
+    a.auxWord = 0x01020304, a.auxFlag = 5;
+    a.rightEye = zbm_Pos{150, 250}, a.leftEye = zbm_Pos{250, 251};
+    a.rightMouthEnd = zbm_Pos{160, 350}, a.leftMouthEnd = zbm_Pos{240, 351};
+    a.codeValid = 1, a.codeFlag = 1, a.code = 9, a.orientation = 2;
+    a.flagsValid = 1, a.flagA = 1;
+    a.statesValid = 1, a.stateA = _FaceRegionState{1, 2}, a.stateB = _FaceRegionState{0, 1};
     a.stateC = _FaceRegionState{1, 3};
-    a.ageMin = 20;
-    a.ageMax = 30;
+    a.ageMin = 20, a.ageMax = 30;
     const uint8_t attributes[4] = {1, 80, 2, 15};
     std::memcpy(a.pAttributes, attributes, 4);
     SetPart(a, 0, '%', 123.5f, 200.25f);
@@ -120,19 +105,12 @@ inline void FillTwoFaces(Owner& o) {
 
     _FaceRegion& b = o[1];
     b.faceArea = zbm_Rect{2000, 1000, 500, 600};
-    b.rotation[0] = 0.0f;
-    b.rotation[1] = 0.125f;
-    b.rotation[2] = -1.5f;
-    b.rightEye = zbm_Pos{2100, 1200};
-    b.leftEye = zbm_Pos{2300, 1210};
+    b.rotation[0] = 0.0f, b.rotation[1] = 0.125f, b.rotation[2] = -1.5f;
+    b.rightEye = zbm_Pos{2100, 1200}, b.leftEye = zbm_Pos{2300, 1210};
     // The container has no per-face present flags: a field stored for one
     // face is read back as present for all, so set them on both.
-    b.flagsValid = 1;
-    b.flagB = 1;
-    b.statesValid = 1;
-    b.codeValid = 1;
-    b.ageMin = 40;
-    b.ageMax = 50;
+    b.flagsValid = 1, b.flagB = 1, b.statesValid = 1, b.codeValid = 1;
+    b.ageMin = 40, b.ageMax = 50;
     b.pAttributes[0] = 2;
     b.pAttributes[1] = 60;
     std::strncpy(b.featureType, "na", sizeof b.featureType);

@@ -199,8 +199,8 @@ uint32_t OFM_SerializeOfmData(uint16_t byteOrder, uint8_t* pBuf, uint32_t bufSiz
 /* Reads and checks the container header at pBuf (bufSize bytes available)
  * into *header. The endianness comes from byteOrder (0x4D4D big, else
  * little); the stored mark is kept in header->byteOrder but not compared.
- * Bitmap bits a version does not know are cleared. For versions 256 and 257,
- * which store no F, header->fixedSize is derived from the bitmap.
+ * Versions 256 and 257 keep only the bitmap bits they define, and since they
+ * store no F, header->fixedSize is derived from their bitmap.
  * Returns 0; 2 NULL argument; 1 when bufSize is below the header size, the
  * version is not 256..259, the header-size field does not match the version,
  * or (with faces) the fixed bitmap has an unknown bit, the stored F differs
