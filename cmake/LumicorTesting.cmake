@@ -25,7 +25,9 @@ set(LUMICOR_TEST_DATA_DIR ${PROJECT_SOURCE_DIR}/tests/data)
 
 # One test executable per area: <area>/tests/*.cpp and tests/<area>/*.cpp.
 foreach(area ${LUMICOR_AREAS})
+  # C files in a test folder check that public headers compile as C.
   file(GLOB area_tests CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/${area}/tests/*.cpp
+                                         ${PROJECT_SOURCE_DIR}/${area}/tests/*.c
                                          ${PROJECT_SOURCE_DIR}/tests/${area}/*.cpp)
   if(area_tests)
     add_executable(${area}_tests ${area_tests})
