@@ -114,9 +114,17 @@ int Reduce(const _zbm_Image* src, _zbm_Image* dst) {
     return ZBIU_OK;
 }
 
+// Entry into the pyramid: the source is more than twice the destination in
+// either dimension.
 bool MoreThanTwice(int32_t w, int32_t h, const _zbm_Image* dst) {
     return w > 2 * static_cast<int64_t>(dst->width) || h > 2 * static_cast<int64_t>(dst->height);
 }
+
+// Whether the pyramid halves once more: the whole-number ratio of either
+// dimension to the destination is still above 2. A level only slightly
+// above twice the destination (51 for 25) is therefore not halved again but
+// reduced by the final bilinear step, as the stored results expect.
+bool HalveAgain(int32_t w, int32_t h, const _zbm_Image* dst) { return w / dst->width > 2 || h / dst->height > 2; }
 
 // Scratch level of the pyramid: a packed image record over a caller buffer.
 _zbm_Image ScratchImage(uint8_t* data, int32_t width, int32_t height, const _zbm_Image* like) {
@@ -131,21 +139,20 @@ _zbm_Image ScratchImage(uint8_t* data, int32_t width, int32_t height, const _zbm
     return image;
 }
 
-// Strong reduction: halve both dimensions ((n + 1) / 2) while the current
-// size is more than twice the destination in either, ping-ponging between
-// two scratch buffers (odd levels in the first, even levels in the second),
-// then one final reduction into dst.
+// Strong reduction: halve both dimensions to ((n + 1) / 2) with the
+// reduction rule, and repeat while HalveAgain holds, ping-ponging between two
+// scratch buffers (odd levels in the first, even levels in the second); one
+// final reduction then produces dst.
 int ResizePyramid(const _zbm_Image* src, _zbm_Image* dst) {
     const int32_t bpp = src->bytesPerPixel;
-    int32_t w1 = (src->width + 1) / 2, h1 = (src->height + 1) / 2;
-    int32_t w2 = (w1 + 1) / 2, h2 = (h1 + 1) / 2;
-    const bool twoLevels = MoreThanTwice(w1, h1, dst);
+    const int32_t w1 = (src->width + 1) / 2, h1 = (src->height + 1) / 2;
+    const int32_t w2 = (w1 + 1) / 2, h2 = (h1 + 1) / 2;
     // The source passed the 32-bit layout check, so a quarter of it fits.
     lmk::MallocPtr<uint8_t> first(static_cast<uint8_t*>(
         std::malloc(static_cast<size_t>(w1) * static_cast<size_t>(h1) * static_cast<size_t>(bpp))));
     if (!first) return ZBIU_ERR_OUT_OF_MEMORY;
     lmk::MallocPtr<uint8_t> second;
-    if (twoLevels) {
+    if (HalveAgain(w1, h1, dst)) {
         second.reset(static_cast<uint8_t*>(
             std::malloc(static_cast<size_t>(w2) * static_cast<size_t>(h2) * static_cast<size_t>(bpp))));
         if (!second) return ZBIU_ERR_OUT_OF_MEMORY;
@@ -153,16 +160,16 @@ int ResizePyramid(const _zbm_Image* src, _zbm_Image* dst) {
 
     _zbm_Image levels[2];
     const _zbm_Image* current = src;
-    int32_t w = src->width, h = src->height;
-    for (int level = 0; MoreThanTwice(w, h, dst); ++level) {
-        w = (w + 1) / 2;
-        h = (h + 1) / 2;
+    int level = 0;
+    do {
         _zbm_Image& next = levels[level & 1];
-        next = ScratchImage(level & 1 ? second.get() : first.get(), w, h, src);
+        next = ScratchImage(level & 1 ? second.get() : first.get(), (current->width + 1) / 2,
+                            (current->height + 1) / 2, src);
         const int status = Reduce(current, &next);
         if (status != ZBIU_OK) return status;
         current = &next;
-    }
+        ++level;
+    } while (HalveAgain(current->width, current->height, dst));
     return Reduce(current, dst);
 }
 
