@@ -286,7 +286,10 @@ public:
     /* Appends value; 1 on success, 0 when the node cannot be allocated. */
     int PushBack(const T& value) { return Insert(End(), value) != End() ? 1 : 0; }
     /* Prepends value; 1 on success, 0 when the node cannot be allocated. */
-    int PushFront(const T& value) { return Insert(Begin(), value) != Begin() ? 1 : 0; }
+    int PushFront(const T& value) {
+        Node* first = Begin();
+        return Insert(first, value) != first ? 1 : 0;
+    }
     /* Removes the last element; does nothing on an empty list. */
     void PopBack() { Erase(head_.prev); }
     /* Removes the first element; does nothing on an empty list. */
