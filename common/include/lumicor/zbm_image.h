@@ -432,10 +432,14 @@ int ZbiuRotate(const _zbm_Image* src, _zbm_Image* dst, float angle);
 int ZbiuAdjustToExifOrientation(_zbm_Image*& image, int orientation);
 
 /* Scales src to dst's size (same order): equal sizes are copied; when one
- * dimension grows and the other shrinks, two passes through a temporary;
- * enlargements and reductions up to 2x are 10-bit bilinear (exact 2x is the
- * mean of each 2×2 block); stronger reductions halve repeatedly first.
- * Returns 0, 3 for invalid or mismatching images, 4 out of memory. */
+ * dimension grows and the other shrinks, two passes through a temporary
+ * (the shrinking dimension first); enlargements and reductions up to 2x are
+ * 10-bit bilinear (exact 2x is the truncated mean of each 2×2 block); a
+ * reduction of more than 2x in either dimension first halves both
+ * dimensions ((n + 1) / 2), again while a whole-number ratio to the target
+ * is above 2, and finishes with one of the previous rules. src may be an
+ * attached image with a negative pitch. Returns 0, 3 for invalid, identical
+ * or mismatching images, 4 out of memory. */
 int ZbiuResize(const _zbm_Image* src, _zbm_Image* dst);
 
 /* Converts src into dst (same width and height) between pixel orders:

@@ -88,13 +88,8 @@ _zbm_Image* ZbiuCreateAttatchData(void* data, int32_t width, int32_t height, int
     if (!data || !IsValidLayout(width, height, pitch, order)) return nullptr;
     auto* image = static_cast<_zbm_Image*>(std::malloc(sizeof(_zbm_Image)));
     if (!image) return nullptr;
-    image->pData = static_cast<uint8_t*>(data);
-    image->width = width;
-    image->height = height;
-    image->pitch = pitch;
-    image->order = order;
-    image->bytesPerPixel = BytesPerPixel(order);
     image->ownsData = 0;
+    ZbiuReplaceAttatchedData(image, data, width, height, pitch, order);
     return image;
 }
 

@@ -127,8 +127,8 @@ int ZbiuDrawRectangle(_zbm_Image* image, const zbm_Rect& rect, zbm_PackedUchar c
     const int64_t x1 = x0 + rect.width - 1, y1 = y0 + rect.height - 1;
     const int64_t lw = lineWidth;
     if (2 * lw >= rect.width || 2 * lw >= rect.height) {
-        // The outline covers the whole rectangle.
-        FillBox(image, x0, y0, x1, y1, lineWidth > 0 ? color : (fill ? *fill : color));
+        // The outline (lineWidth > 0 here) covers the whole rectangle.
+        FillBox(image, x0, y0, x1, y1, color);
         return ZBIU_OK;
     }
     if (lw > 0) {

@@ -2,6 +2,7 @@
 // passes with an equivalence table.
 #include <lumicor/zbm_image.h>
 
+#include <cstdint>
 #include <cstring>
 
 #include "common/src/image/image_util.h"
@@ -68,8 +69,11 @@ int ZbiuLabeling(const _zbm_Image* image, int32_t* labels, int32_t* count) {
         return ZBIU_ERR_INVALID_ARGUMENT;
     }
     const int32_t w = image->width, h = image->height;
-    // A valid gray layout keeps width × height below 2^31.
-    const size_t total = static_cast<size_t>(w) * static_cast<size_t>(h);
+    // A valid gray layout keeps width × height below 2^31, but the label
+    // array must also be addressable.
+    const uint64_t pixels = static_cast<uint64_t>(w) * static_cast<uint64_t>(h);
+    if (pixels > SIZE_MAX / sizeof(int32_t)) return ZBIU_ERR_INVALID_ARGUMENT;
+    const size_t total = static_cast<size_t>(pixels);
     std::memset(labels, 0, total * sizeof(int32_t));
     *count = 0;
     Equivalences table;
