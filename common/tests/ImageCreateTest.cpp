@@ -42,13 +42,8 @@ TEST(ImageCreateTest, SizeLimitsAndOrders) {
 TEST(ImageCreateTest, FillWritesOnlyStoredBytes) {
     ZbmImagePtr rgb(ZbiuCreate(3, 2, ZBM_PIXEL_ORDER_RGB, Pixel(1, 2, 3, 99)));
     ASSERT_TRUE(rgb);
-    for (int32_t y = 0; y < 2; ++y)
-        for (int32_t x = 0; x < 3; ++x) {
-            const zbm_PackedUchar p = ZbiuGetPixel(rgb.get(), x, y);
-            EXPECT_EQ(p.v[0], 1);
-            EXPECT_EQ(p.v[2], 3);
-            EXPECT_EQ(p.v[3], 0);  // past bytesPerPixel reads as zero
-        }
+    EXPECT_EQ(lumicor::test::CountPixels(rgb.get(), Pixel(1, 2, 3)), 6);
+    EXPECT_EQ(ZbiuGetPixel(rgb.get(), 2, 1).v[3], 0);  // past bytesPerPixel reads as zero
     EXPECT_EQ(ZbiuClear(rgb.get(), Pixel(7, 7, 7)), ZBIU_OK);
     EXPECT_EQ(lumicor::test::CountPixels(rgb.get(), Pixel(7, 7, 7)), 6);
     EXPECT_EQ(ZbiuClear(nullptr), ZBIU_ERR_INVALID_ARGUMENT);
