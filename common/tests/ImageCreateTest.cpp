@@ -87,6 +87,11 @@ TEST(ImageCreateTest, NegativePitchSourcesReadTopRowFirst) {
     EXPECT_TRUE(SameImage(copy.get(), view.get()));
     ZbmImagePtr clone(ZbiuCreateClone(view.get()));
     EXPECT_TRUE(SameImage(clone.get(), view.get()));
+    ZbmImagePtr fromView(ZbiuCreate(w, h, ZBM_PIXEL_ORDER_BGRA)), fromCopy(ZbiuCreate(w, h, ZBM_PIXEL_ORDER_BGRA));
+    ASSERT_EQ(ZbiuConvertColorSpace(view.get(), fromView.get()), ZBIU_OK);
+    ASSERT_EQ(ZbiuConvertColorSpace(copy.get(), fromCopy.get()), ZBIU_OK);
+    EXPECT_TRUE(SameImage(fromView.get(), fromCopy.get()));
+    EXPECT_EQ(ZbiuGetPixel(fromView.get(), 1, 0).v[2], 10 * (h - 1) + 3);  // red moved to offset 2
 
     // Pointer writes are bounded by the rows, whichever way they run.
     ZbiuSetPixel(view.get(), ZbiuGetPointer(view.get(), 0, h - 1), Pixel(200, 201, 202));
