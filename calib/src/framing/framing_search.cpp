@@ -165,6 +165,27 @@ void LevelSize(const FramingSearch* fs, float a, float s, int32_t* width, int32_
 
 }  // namespace
 
+void ToPixels(const FramingSearch* fs, CropRegion* crop) {
+    crop->left = static_cast<int32_t>(static_cast<float>(crop->left) * crop->scaleX + 0.5f);
+    crop->top = static_cast<int32_t>(static_cast<float>(crop->top) * crop->scaleY + 0.5f);
+    crop->width = static_cast<int32_t>(static_cast<float>(crop->width) * crop->scaleX + 0.5f);
+    crop->height = static_cast<int32_t>(static_cast<float>(crop->height) * crop->scaleY + 0.5f);
+
+    // Rounding may leave the crop a pixel past the right or bottom edge:
+    // shrink it, the other side following the aspect, until it fits.
+    const float a = crop->aspectRatio;
+    while (CA::CalcPenCIEnergy(fs, crop) != 0.0f) {
+        if (a <= 1.0f) {
+            crop->width -= 1;
+            crop->height = static_cast<int32_t>(static_cast<float>(crop->width) * a + 0.5f);
+        } else {
+            crop->height -= 1;
+            crop->width = static_cast<int32_t>(static_cast<float>(crop->height) / a + 0.5f);
+        }
+        if (crop->width < 0 || crop->height < 0) break;
+    }
+}
+
 uint32_t Coarse2Fine(FramingSearch* fs, VAMarge* va, CropRegion* crop, SearchRegion region,
                      ObjectFunction* of) {
     std::unique_ptr<CropRegion> work(new (std::nothrow) CropRegion(*crop));
@@ -236,24 +257,7 @@ uint32_t Coarse2Fine(FramingSearch* fs, VAMarge* va, CropRegion* crop, SearchReg
     }
     work.reset();
 
-    // To photo pixels.
-    crop->left = static_cast<int32_t>(static_cast<float>(crop->left) * crop->scaleX + 0.5f);
-    crop->top = static_cast<int32_t>(static_cast<float>(crop->top) * crop->scaleY + 0.5f);
-    crop->width = static_cast<int32_t>(static_cast<float>(crop->width) * crop->scaleX + 0.5f);
-    crop->height = static_cast<int32_t>(static_cast<float>(crop->height) * crop->scaleY + 0.5f);
-
-    // Rounding may leave the crop a pixel past the right or bottom edge:
-    // shrink it, the other side following the aspect, until it fits.
-    while (CA::CalcPenCIEnergy(fs, crop) != 0.0f) {
-        if (a <= 1.0f) {
-            crop->width -= 1;
-            crop->height = static_cast<int32_t>(static_cast<float>(crop->width) * a + 0.5f);
-        } else {
-            crop->height -= 1;
-            crop->width = static_cast<int32_t>(static_cast<float>(crop->height) / a + 0.5f);
-        }
-        if (crop->width < 0 || crop->height < 0) break;
-    }
+    ToPixels(fs, crop);
     return 0;
 }
 

@@ -68,6 +68,12 @@ namespace Opt {
 uint32_t Coarse2Fine(FramingSearch* fs, VAMarge* va, CropRegion* crop, SearchRegion region,
                      ObjectFunction* of);
 
+// Converts a winning grid crop to photo pixels with the crop's scales and
+// pulls it inside the photo: while it reaches past the right or bottom edge
+// it loses a pixel of width (aspect <= 1) or height, the other side following
+// the aspect; left and top stay.
+void ToPixels(const FramingSearch* fs, CropRegion* crop);
+
 }  // namespace Opt
 
 #endif
