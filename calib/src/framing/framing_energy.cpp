@@ -103,12 +103,15 @@ Thirds ThirdsOf(const CropRegion* crop) {
     return t;
 }
 
-// Everything the composition needs of one area against one crop.
+// Everything the composition needs of one area against one crop. Distances
+// are kept squared and rooted only where needed: the rounded square root is
+// monotonic, so the root of the smallest square is exactly the smallest root.
 struct AreaFit {
     ShapeClass shape;
     int32_t ax, ay;  // anchor
-    float d[4];      // distances to the power points P1 (x1,y1), P2 (x2,y1), P3 (x1,y2), P4 (x2,y2)
+    float sq[4];     // squared distances to P1 (x1,y1), P2 (x2,y1), P3 (x1,y2), P4 (x2,y2)
     float target;    // distance to the target point of the composition rule
+    float D(int k) const { return std::sqrt(sq[k]); }
 };
 
 void AnchorOf(const VAMarge* va, int i, int32_t* ax, int32_t* ay) {
@@ -134,39 +137,42 @@ AreaFit FitArea(const FramingSearch* fs, const VAMarge* va, const CropRegion* cr
     const float dx2 = th.x2 - ax;
     const float dy1 = static_cast<float>(th.y1) - ay;
     const float dy2 = static_cast<float>(th.y2) - ay;
-    f.d[0] = Distance(dx1, dy1);
-    f.d[1] = Distance(dx2, dy1);
-    f.d[2] = Distance(dx1, dy2);
-    f.d[3] = Distance(dx2, dy2);
+    f.sq[0] = dx1 * dx1 + dy1 * dy1;
+    f.sq[1] = dx2 * dx2 + dy1 * dy1;
+    f.sq[2] = dx1 * dx1 + dy2 * dy2;
+    f.sq[3] = dx2 * dx2 + dy2 * dy2;
 
+    float targetSq;
     if (va->centre) {
         const float cx = static_cast<float>(crop->left + crop->left + crop->width) * 0.5f;
         const float cy = static_cast<float>(crop->top + crop->top + crop->height) * 0.5f;
         const float bx = static_cast<float>((va->mergeLeft + va->mergeRight) >> 1);
         const float by = static_cast<float>((va->mergeTop + va->mergeBottom) >> 1);
-        f.target = Distance(cx - bx, cy - by);
+        targetSq = (cx - bx) * (cx - bx) + (cy - by) * (cy - by);
     } else if (va->isFace[0]) {
         // Leave room in the direction the main face looks.
         const int m = va->mainIndex;
         switch (va->direction[m]) {
-            case 1: f.target = f.d[0]; break;
-            case 2: f.target = f.d[2]; break;
-            case 3: f.target = Min2(f.d[2], f.d[3]); break;
-            case 4: f.target = f.d[3]; break;
+            case 1: targetSq = f.sq[0]; break;
+            case 2: targetSq = f.sq[2]; break;
+            case 3: targetSq = Min2(f.sq[2], f.sq[3]); break;
+            case 4: targetSq = f.sq[3]; break;
             case 5:
-            case 6: f.target = f.d[1]; break;
-            case 7: f.target = Min2(f.d[0], f.d[1]); break;
-            case 8: f.target = f.d[0]; break;
+            case 6: targetSq = f.sq[1]; break;
+            case 7: targetSq = Min2(f.sq[0], f.sq[1]); break;
+            case 8: targetSq = f.sq[0]; break;
             default: {
                 const int32_t mainBottom = va->y[m] + va->height[m];
                 const int32_t margin = static_cast<int32_t>(0.15f * static_cast<float>(fs->H));
-                f.target = margin <= fs->H - mainBottom ? Min2(f.d[0], f.d[1]) : Min2(f.d[2], f.d[3]);
+                targetSq = margin <= fs->H - mainBottom ? Min2(f.sq[0], f.sq[1])
+                                                        : Min2(f.sq[2], f.sq[3]);
                 break;
             }
         }
     } else {
-        f.target = Min2(Min2(f.d[0], f.d[1]), Min2(f.d[2], f.d[3]));
+        targetSq = Min2(Min2(f.sq[0], f.sq[1]), Min2(f.sq[2], f.sq[3]));
     }
+    f.target = std::sqrt(targetSq);
     return f;
 }
 
@@ -174,15 +180,15 @@ AreaFit FitArea(const FramingSearch* fs, const VAMarge* va, const CropRegion* cr
 float VerticalLineDistance(const Thirds& th, const AreaFit& f) {
     const int32_t dv1 = std::abs(static_cast<int32_t>(th.x1) - f.ax);
     const int32_t dv2 = std::abs(static_cast<int32_t>(th.x2) - f.ax);
-    if (dv2 < dv1) return static_cast<float>(dv2) + (f.d[1] + f.d[3]) / 2.0f;
-    return static_cast<float>(dv1) + (f.d[0] + f.d[2]) / 2.0f;
+    if (dv2 < dv1) return static_cast<float>(dv2) + (f.D(1) + f.D(3)) / 2.0f;
+    return static_cast<float>(dv1) + (f.D(0) + f.D(2)) / 2.0f;
 }
 
 float HorizontalLineDistance(const Thirds& th, const AreaFit& f) {
     const int32_t dh1 = std::abs(th.y1 - f.ay);
     const int32_t dh2 = std::abs(th.y2 - f.ay);
-    if (dh2 < dh1) return static_cast<float>(dh2) + (f.d[2] + f.d[3]) / 2.0f;
-    return static_cast<float>(dh1) + (f.d[0] + f.d[1]) / 2.0f;
+    if (dh2 < dh1) return static_cast<float>(dh2) + (f.D(2) + f.D(3)) / 2.0f;
+    return static_cast<float>(dh1) + (f.D(0) + f.D(1)) / 2.0f;
 }
 
 // point * eT^2 + vertical * eV^2 + horizontal * eH^2. A zero weight adds an
@@ -219,9 +225,11 @@ float CalcCompEnergy(const FramingSearch* fs, const VAMarge* va, const CropRegio
         float weighted = 0.0f;
         float total = 0.0f;
         for (int i = 0; i < n; ++i) {
+            total += va->importance[i];
+            // A zero importance adds an exact zero whatever the score.
+            if (va->importance[i] == 0.0f) continue;
             const AreaFit f = FitArea(fs, va, crop, th, i);
             weighted += va->importance[i] * SquaredShapeScore(th, f, diag);
-            total += va->importance[i];
         }
         return total == 0.0f ? 0.0f : weighted / total;
     }
@@ -231,8 +239,8 @@ float CalcCompEnergy(const FramingSearch* fs, const VAMarge* va, const CropRegio
         const AreaFit fs2 = FitArea(fs, va, crop, th, s);
         float em[4], es[4];
         for (int k = 0; k < 4; ++k) {
-            em[k] = Closeness(fm.d[k], diag);
-            es[k] = Closeness(fs2.d[k], diag);
+            em[k] = Closeness(fm.D(k), diag);
+            es[k] = Closeness(fs2.D(k), diag);
         }
         float best = em[0] * es[3];
         best = std::max(best, em[3] * es[0]);

@@ -5,9 +5,8 @@
 #include <limits>
 
 namespace lmk {
-namespace {
+namespace detail {
 
-// 2^(j/64) for j = 0..63, each the double nearest to the exact value.
 const double kExp2Table[64] = {
     0x1.0000000000000p+0, 0x1.02c9a3e778061p+0,
     0x1.059b0d3158574p+0, 0x1.0874518759bc8p+0,
@@ -43,18 +42,11 @@ const double kExp2Table[64] = {
     0x1.f50765b6e4540p+0, 0x1.fa7c1819e90d8p+0,
 };
 
-const double kInvLn2N = 0x1.71547652b82fep+6;    // 64 / ln 2
-const double kLn2HiN = 0x1.62e42fee00000p-7;     // ln 2 / 64, upper part (k * hi is exact)
-const double kLn2LoN = 0x1.a39ef35793c76p-39;    // ln 2 / 64 - kLn2HiN
-const double kRoundShift = 0x1.8p52;             // adding it rounds to an integer
+}  // namespace detail
 
-double Pow2(int e) {  // 2^e for -1022 <= e <= 1023
-    const uint64_t bits = static_cast<uint64_t>(e + 1023) << 52;
-    double d;
-    std::memcpy(&d, &bits, sizeof d);
-    return d;
-}
-
+namespace {
+const double kLn2HiN = 0x1.62e42fee00000p-7;  // ln 2 / 64, upper part (k * hi is exact)
+const double kLn2LoN = 0x1.a39ef35793c76p-39; // ln 2 / 64 - kLn2HiN
 }  // namespace
 
 double Exp(double x) {
@@ -63,11 +55,13 @@ double Exp(double x) {
     if (x < -745.2) return 0.0;
 
     // x = (64 m + j) ln2/64 + r with |r| <= ln2/128.
-    double kd = x * kInvLn2N + kRoundShift;
+    using detail::kExp2Table;
+    using detail::Pow2;
+    double kd = x * detail::kInvLn2N + detail::kRoundShift;
     uint64_t bits;
     std::memcpy(&bits, &kd, sizeof bits);
     const int32_t k = static_cast<int32_t>(static_cast<uint32_t>(bits));
-    kd -= kRoundShift;
+    kd -= detail::kRoundShift;
     const double r = (x - kd * kLn2HiN) - kd * kLn2LoN;
 
     // Taylor polynomial to r^5: the remainder is below half an ulp for |r| <= ln2/128.
@@ -82,7 +76,5 @@ double Exp(double x) {
     // Subnormal result: scale in two steps so that no step leaves the normal range early.
     return (y * Pow2(m + 960)) * Pow2(-960);
 }
-
-float ExpF(float x) { return static_cast<float>(Exp(static_cast<double>(x))); }
 
 }  // namespace lmk
