@@ -57,8 +57,7 @@ private:
     uint32_t state_;
 };
 
-// A random valid framing case: photo size, parameters and up to 20 areas
-// inside the photo.
+// A random valid case: photo size, parameters and up to 20 areas inside the photo.
 struct RandomCase {
     uint32_t width;
     uint32_t height;
