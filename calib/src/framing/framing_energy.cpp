@@ -8,6 +8,10 @@
 #include "calib/src/framing/va_marge.h"
 #include "common/src/internal/portable_math.h"
 
+// The per-area helpers run for every area of every candidate; inlined, the
+// independent exponentials of several areas overlap in the pipeline.
+#define FRAMING_INLINE inline __attribute__((always_inline))
+
 namespace CA {
 
 void SetFuncCoef(ObjectFunction* of, const VAMarge* va) {
@@ -65,7 +69,7 @@ struct ShapeClass {
     float horizontal;
 };
 
-ShapeClass ShapeOf(const FramingSearch* fs, const VAMarge* va, int i) {
+FRAMING_INLINE ShapeClass ShapeOf(const FramingSearch* fs, const VAMarge* va, int i) {
     if (static_cast<float>(va->width[i]) < 0.25f * static_cast<float>(fs->W) &&
         static_cast<float>(va->height[i]) < 0.25f * static_cast<float>(fs->H)) {
         return {1.0f, 0.0f, 0.0f};
@@ -126,7 +130,7 @@ void AnchorOf(const VAMarge* va, int i, int32_t* ax, int32_t* ay) {
 
 float Min2(float a, float b) { return b < a ? b : a; }
 
-AreaFit FitArea(const FramingSearch* fs, const VAMarge* va, const CropRegion* crop,
+FRAMING_INLINE AreaFit FitArea(const FramingSearch* fs, const VAMarge* va, const CropRegion* crop,
                 const Thirds& th, int i) {
     AreaFit f;
     f.shape = ShapeOf(fs, va, i);
@@ -193,7 +197,7 @@ float HorizontalLineDistance(const Thirds& th, const AreaFit& f) {
 
 // point * eT^2 + vertical * eV^2 + horizontal * eH^2. A zero weight adds an
 // exact zero, so its closeness is not computed.
-float SquaredShapeScore(const Thirds& th, const AreaFit& f, float diag) {
+FRAMING_INLINE float SquaredShapeScore(const Thirds& th, const AreaFit& f, float diag) {
     const float eT = Closeness(f.target, diag);
     float score = f.shape.point * (eT * eT);
     if (f.shape.vertical != 0.0f) {
