@@ -77,7 +77,9 @@ TEST(SimilarityExtractTest, RejectsBadArguments) {
         _KtMetaSimilarity* out = c.outSet ? &dummy : nullptr;
         const int status = KtSimlExtract(c.pixels, c.w, c.h, c.pitch, c.format, c.nullOut ? nullptr : &out);
         EXPECT_EQ(status, c.want);
-        if (!c.nullOut) EXPECT_EQ(out, c.outSet ? &dummy : nullptr);
+        if (!c.nullOut) {
+            EXPECT_EQ(out, c.outSet ? &dummy : nullptr);
+        }
     }
 }
 
