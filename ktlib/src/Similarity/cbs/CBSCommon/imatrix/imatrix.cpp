@@ -30,8 +30,72 @@ int32_t WrapAdd(int32_t a, int32_t b) { return static_cast<int32_t>(static_cast<
 int32_t WrapMul(int32_t a, int32_t b) { return static_cast<int32_t>(static_cast<uint32_t>(a) * static_cast<uint32_t>(b)); }
 
 // round(256 cos(2 pi i / 16)) and round(256 sin(2 pi i / 16)).
-const int32_t kCos[16] = {256, 237, 181, 98, 0, -98, -181, -237, -256, -237, -181, -98, 0, 98, 181, 237};
-const int32_t kSin[16] = {0, 98, 181, 237, 256, 237, 181, 98, 0, -98, -181, -237, -256, -237, -181, -98};
+constexpr int32_t kCos[16] = {256, 237, 181, 98, 0, -98, -181, -237, -256, -237, -181, -98, 0, 98, 181, 237};
+constexpr int32_t kSin[16] = {0, 98, 181, 237, 256, 237, 181, 98, 0, -98, -181, -237, -256, -237, -181, -98};
+
+// Byte samples (luma) take a faster path with the same truncated terms: the
+// texture feature runs this DFT some 2,000 times per photo. Every twiddle
+// factor is +-256, 237, 181, 98 or 0, so each term is +-trunc(f x / 256) for
+// one of four magnitudes f (a floor for x >= 0). Samples n and n + 8 meet
+// the same factor at even frequencies and its negation at odd ones, so their
+// already truncated terms are added (or subtracted) first.
+struct TwiddleCodes {
+    uint8_t cosMagnitude[9][8];  // 0: factor 0; 1..4: 98, 181, 237, 256
+    int8_t cosSign[9][8];
+    uint8_t sinMagnitude[9][8];
+    int8_t sinSign[9][8];
+};
+
+constexpr int MagnitudeCode(int32_t f) {
+    return f == 0 ? 0 : ((f < 0 ? -f : f) == 98 ? 1 : ((f < 0 ? -f : f) == 181 ? 2 : ((f < 0 ? -f : f) == 237 ? 3 : 4)));
+}
+
+constexpr TwiddleCodes MakeTwiddleCodes() {
+    TwiddleCodes t{};
+    for (int k = 0; k <= 8; ++k)
+        for (int n = 0; n < 8; ++n) {
+            const int32_t c = kCos[(n * k) % 16], s = kSin[(n * k) % 16];
+            t.cosMagnitude[k][n] = static_cast<uint8_t>(MagnitudeCode(c));
+            t.cosSign[k][n] = static_cast<int8_t>(c < 0 ? -1 : 1);
+            t.sinMagnitude[k][n] = static_cast<uint8_t>(MagnitudeCode(s));
+            t.sinSign[k][n] = static_cast<int8_t>(s < 0 ? -1 : 1);
+        }
+    return t;
+}
+
+constexpr TwiddleCodes kCodes = MakeTwiddleCodes();
+
+bool AllBytes(const int32_t x[16]) {
+    uint32_t any = 0;
+    for (int n = 0; n < 16; ++n) any |= static_cast<uint32_t>(x[n]);
+    return any <= 255;
+}
+
+void Fft16Bytes(int32_t x[16]) {
+    const int32_t factor[5] = {0, 98, 181, 237, 256};
+    // pair[parity][n][code]: term of sample n plus (even) or minus (odd) the
+    // term of sample n + 8.
+    int32_t pair[2][8][5];
+    for (int n = 0; n < 8; ++n) {
+        for (int q = 0; q < 5; ++q) {
+            const int32_t a = (factor[q] * x[n]) >> 8;
+            const int32_t b = (factor[q] * x[n + 8]) >> 8;
+            pair[0][n][q] = a + b;
+            pair[1][n][q] = a - b;
+        }
+    }
+    uint32_t magnitude2[9];
+    for (int k = 0; k <= 8; ++k) {
+        const int32_t(*terms)[5] = pair[k & 1];
+        int32_t re = 0, im = 0;
+        for (int n = 0; n < 8; ++n) {
+            re += kCodes.cosSign[k][n] * terms[n][kCodes.cosMagnitude[k][n]];
+            im += kCodes.sinSign[k][n] * terms[n][kCodes.sinMagnitude[k][n]];
+        }
+        magnitude2[k] = static_cast<uint32_t>(re * re + im * im);
+    }
+    for (int k = 0; k <= 8; ++k) x[k] = static_cast<int32_t>(isqrt(magnitude2[k]));
+}
 
 }  // namespace
 
@@ -216,6 +280,15 @@ extern "C" int matrix_transpose(_matrix_s* m) {
 
 extern "C" int matrix_crop_image_y(_matrix_s* m, const _image_s* image, int x, int y) {
     if (!Valid(m) || !image || !image->data) return -1;
+    if (x >= 0 && y >= 0 && m->cols <= image->width - x && m->rows <= image->height - y) {
+        // Wholly inside: no per-pixel checks.
+        for (int r = 0; r < m->rows; ++r) {
+            const uint8_t* p = image->data + (static_cast<size_t>(y + r) * image->width + static_cast<size_t>(x)) * 4;
+            int32_t* out = &At(m, r, 0);
+            for (int c = 0; c < m->cols; ++c, p += 4) out[c] = (306 * p[0] + 601 * p[1] + 117 * p[2] + 512) >> 10;
+        }
+        return 0;
+    }
     for (int r = 0; r < m->rows; ++r) {
         const int64_t iy = static_cast<int64_t>(y) + r;
         for (int c = 0; c < m->cols; ++c) {
@@ -232,6 +305,10 @@ extern "C" int matrix_crop_image_y(_matrix_s* m, const _image_s* image, int x, i
 }
 
 extern "C" void fft16(int32_t x[16]) {
+    if (AllBytes(x)) {
+        Fft16Bytes(x);
+        return;
+    }
     uint32_t magnitude2[9];
     for (int k = 0; k <= 8; ++k) {
         // Each term is divided on its own (truncating toward zero) before it is

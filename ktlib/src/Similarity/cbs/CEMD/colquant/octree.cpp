@@ -133,13 +133,33 @@ extern "C" void octree_kill(_octree* tree) {
     std::free(tree);
 }
 
+namespace {
+
+// Bits 7..4 of a channel value spread to their places in the leaf index
+// (bit 7 to bit 9 + shift, ..., bit 4 to bit shift), for shift 2, 1, 0.
+struct SpreadTable {
+    uint16_t bits[3][256];
+};
+
+constexpr SpreadTable MakeSpreadTable() {
+    SpreadTable t{};
+    for (int shift = 0; shift < 3; ++shift)
+        for (int v = 0; v < 256; ++v) {
+            int index = 0;
+            for (int bit = 7; bit >= 4; --bit) index = (index << 3) | (((v >> bit) & 1) << shift);
+            t.bits[2 - shift][v] = static_cast<uint16_t>(index);
+        }
+    return t;
+}
+
+constexpr SpreadTable kSpread = MakeSpreadTable();
+
+int LeafIndex(uint8_t c0, uint8_t c1, uint8_t c2) { return kSpread.bits[0][c0] | kSpread.bits[1][c1] | kSpread.bits[2][c2]; }
+
+}  // namespace
+
 extern "C" int octree_get_five_layer_index(int c0, int c1, int c2) {
-    int index = 0;
-    for (int bit = 7; bit >= 4; --bit) {
-        const int group = (((c0 >> bit) & 1) << 2) | (((c1 >> bit) & 1) << 1) | ((c2 >> bit) & 1);
-        index = (index << 3) | group;
-    }
-    return index;
+    return LeafIndex(static_cast<uint8_t>(c0), static_cast<uint8_t>(c1), static_cast<uint8_t>(c2));
 }
 
 extern "C" int octree_build(_octree* tree, const _image_s* image) {
@@ -152,7 +172,7 @@ extern "C" int octree_build(_octree* tree, const _image_s* image) {
     const size_t pixels = static_cast<size_t>(image->width) * static_cast<size_t>(image->height);
     const uint8_t* p = image->data;
     for (size_t i = 0; i < pixels; ++i, p += 4) {
-        _octnode& leaf = leaves[octree_get_five_layer_index(p[0], p[1], p[2])];
+        _octnode& leaf = leaves[LeafIndex(p[0], p[1], p[2])];
         leaf.sum[0] += p[0];
         leaf.sum[1] += p[1];
         leaf.sum[2] += p[2];
