@@ -57,8 +57,8 @@ Metric::Metric(const float* edge1, const float* edge2) : edge1_(edge1), edge2_(e
 Metric::~Metric() {}
 
 double Metric::calculateSizeCorrelation() {
-    if (!edge1_ || !edge2_) return -1.0;
     Energies e1, e2;
+    if (!edge1_ || !edge2_) return -1.0;
     Accumulate(edge1_, &e1);
     Accumulate(edge2_, &e2);
     Correlation c;
@@ -69,17 +69,15 @@ double Metric::calculateSizeCorrelation() {
 }
 
 double Metric::calculateAngleCorrelation() {
-    if (!edge1_ || !edge2_) return -1.0;
     Energies e1, e2;
+    if (!edge1_ || !edge2_) return -1.0;
     Accumulate(edge1_, &e1);
     Accumulate(edge2_, &e2);
     Correlation c;
-    for (int s = 0; s < kScales; ++s)
-        for (int r = 0; r < kRegions; ++r)
-            for (int o = 0; o < kOrientations; ++o) {
-                const int i = 27 * s + 3 * r + o;
-                c.Add(CentredShare(edge1_[i], e1.region[s][r], 1.0 / 3.0), CentredShare(edge2_[i], e2.region[s][r], 1.0 / 3.0));
-            }
+    for (int i = 0; i < kScales * kRegions * kOrientations; ++i) {
+        const int s = i / 27, r = (i % 27) / 3;
+        c.Add(CentredShare(edge1_[i], e1.region[s][r], 1.0 / 3.0), CentredShare(edge2_[i], e2.region[s][r], 1.0 / 3.0));
+    }
     return c.Value();
 }
 

@@ -70,56 +70,50 @@ extern "C" void texture_print(const _texture_s* t, FILE* stream) {
     std::fprintf(stream, "}\n");
 }
 
-extern "C" int texture_histogram_t2(_texture_s* t, const _image_s* image) {
-    if (!t || t->bins != KT_TEXTURE_BINS || !ValidImage(image)) return -1;
-    if (!Start(t, image)) return 0;
+// Runs `count` on every complete 16 x 16 block, once with the rows' DFT
+// magnitudes for the horizontal histogram and once with the columns' for the
+// vertical one. -1 when the block matrix cannot be allocated.
+template <typename Count>
+int ForEachBlock(_texture_s* t, const _image_s* image, Count count) {
     _matrix_s block;
     if (matrix_init(&block, kBlock, kBlock) != 0) return -1;
     for (int y = 0; y <= image->height - kBlock; y += kBlock) {
         for (int x = 0; x <= image->width - kBlock; x += kBlock) {
-            // Rows of the block: horizontal frequencies.
             matrix_crop_image_y(&block, image, x, y);
             matrix_dft_hor(&block);
-            for (int r = 0; r < kBlock; ++r) {
-                int32_t* row = block.data + r * kBlock;
-                WeightLowFrequencies(row);
-                ++t->horizontal[DominantBin(row, 20)];
-            }
-            // Columns of the block: vertical frequencies.
+            count(block.data, t->horizontal);
             matrix_crop_image_y(&block, image, x, y);
             matrix_transpose(&block);
             matrix_dft_hor(&block);
-            for (int r = 0; r < kBlock; ++r) {
-                int32_t* row = block.data + r * kBlock;
-                WeightLowFrequencies(row);
-                ++t->vertical[DominantBin(row, 20)];
-            }
+            count(block.data, t->vertical);
         }
     }
     matrix_free(&block);
     return 0;
 }
 
+extern "C" int texture_histogram_t2(_texture_s* t, const _image_s* image) {
+    if (!t || t->bins != KT_TEXTURE_BINS || !ValidImage(image)) return -1;
+    if (!Start(t, image)) return 0;
+    // One count per row (or column) of the block.
+    return ForEachBlock(t, image, [](int32_t* magnitudes, int32_t* histogram) {
+        for (int r = 0; r < kBlock; ++r) {
+            int32_t* row = magnitudes + r * kBlock;
+            WeightLowFrequencies(row);
+            ++histogram[DominantBin(row, 20)];
+        }
+    });
+}
+
 extern "C" int texture_histogram_t(_texture_s* t, const _image_s* image) {
     if (!t || t->bins != KT_TEXTURE_BINS || !ValidImage(image)) return -1;
     if (!Start(t, image)) return 0;
-    _matrix_s block;
-    if (matrix_init(&block, kBlock, kBlock) != 0) return -1;
-    for (int y = 0; y <= image->height - kBlock; y += kBlock) {
-        for (int x = 0; x <= image->width - kBlock; x += kBlock) {
-            for (int direction = 0; direction < 2; ++direction) {
-                matrix_crop_image_y(&block, image, x, y);
-                if (direction == 1) matrix_transpose(&block);
-                matrix_dft_hor(&block);
-                int32_t sum[kBlock] = {};
-                for (int r = 0; r < kBlock; ++r)
-                    for (int f = 0; f < kBlock; ++f) sum[f] += block.data[r * kBlock + f];
-                WeightLowFrequencies(sum);
-                int32_t* histogram = direction == 0 ? t->horizontal : t->vertical;
-                ++histogram[DominantBin(sum, 400)];
-            }
-        }
-    }
-    matrix_free(&block);
-    return 0;
+    // One count per block, from the sum of its magnitude vectors.
+    return ForEachBlock(t, image, [](int32_t* magnitudes, int32_t* histogram) {
+        int32_t sum[kBlock] = {};
+        for (int r = 0; r < kBlock; ++r)
+            for (int f = 0; f < kBlock; ++f) sum[f] += magnitudes[r * kBlock + f];
+        WeightLowFrequencies(sum);
+        ++histogram[DominantBin(sum, 400)];
+    });
 }
