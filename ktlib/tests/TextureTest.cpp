@@ -122,18 +122,3 @@ TEST(TextureTest, VerticalEdgeLandsInItsBandAndRegions) {
     // 20 rows of one coefficient (0 - 255) x 0.707106781^2 x 2 each.
     EXPECT_NEAR(edge[3 * 4 + 1], 20 * 255.0, 0.01);
 }
-
-TEST(TextureTest, MatrixTransposeRefusesNonSquare) {
-    _matrix_s* m = matrix_create(2, 3);
-    ASSERT_NE(m, nullptr);
-    EXPECT_EQ(matrix_transpose(m), -1);
-    _matrix_s* sq = matrix_create(2, 2);
-    ASSERT_NE(sq, nullptr);
-    matrix_set(sq, 0, 1, 5);
-    EXPECT_EQ(matrix_transpose(sq), 0);
-    EXPECT_EQ(matrix_get(sq, 1, 0), 5);
-    EXPECT_EQ(matrix_get(sq, 0, 1), 0);
-    EXPECT_EQ(matrix_get(sq, 2, 0), -1);
-    matrix_kill(m);
-    matrix_kill(sq);
-}

@@ -54,9 +54,7 @@ ColorCompornent* ColorHistogram::GetCompornent(int index) {
 }
 
 ColorLabelingModuleAchromatic::ColorLabelingModuleAchromatic(const _achromaticModuleParam& param)
-    : lRadius_(param.lRadius),
-      chromaRadius_(param.chromaRadius),
-      lCenter_(param.lCenter),
+    : lCenter_(param.lCenter),
       lRadius2_(param.lRadius * param.lRadius),
       chromaRadius2_(param.chromaRadius * param.chromaRadius) {}
 

@@ -60,8 +60,6 @@ public:
     int JudgeColor(int L, int a, int b) const override;
 
 private:
-    int32_t lRadius_;
-    int32_t chromaRadius_;
     int32_t lCenter_;
     int32_t lRadius2_;
     int32_t chromaRadius2_;
