@@ -8,7 +8,7 @@ FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev
 
-.PHONY: all deps build test demo fuzz bench install clean sample-photos $(addprefix test-,$(PRESETS))
+.PHONY: all deps build test demo fuzz bench install clean sample-photos
 
 all: build
 
@@ -31,10 +31,14 @@ build: deps
 
 test: deps sample-photos $(addprefix test-,$(PRESETS))
 
-test-%:
+# Not .PHONY: make skips pattern rules for phony targets; FORCE keeps them
+# running every time.
+test-%: FORCE
 	cmake --preset $*
 	cmake --build --preset $*
 	ctest --preset $*
+
+FORCE:
 
 demo: build
 	./build/default/tools/lumicor_demo/lumicor_demo
