@@ -1,7 +1,7 @@
 // Debug PPM images of an analysed photo and the PPM writer behind them.
 #include "common/src/internal/ppm.h"
 #include "lumicor/src/interface/lmc_debug_output.h"
-#include "testkit/temp_dir.h"
+#include "testkit/files.h"
 
 #include <lumicor/lmc.h>
 #include <lumicor/vond.h>

@@ -3,6 +3,7 @@
 // committed fuzz seeds and allocation failures.
 #include "lumicor/src/driver/vond_meta_sections.h"
 #include "testkit/fault.h"
+#include "testkit/files.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
@@ -366,13 +367,8 @@ TEST(VondMetaTest, CommittedFuzzSeedsParseAndRoundTrip) {
         if (e->d_name[0] == '.') continue;
         const std::string path = dir + "/" + e->d_name;
         SCOPED_TRACE(path);
-        std::FILE* fp = std::fopen(path.c_str(), "rb");
-        ASSERT_NE(fp, nullptr);
         std::vector<uint8_t> blob;
-        uint8_t chunk[4096];
-        size_t n;
-        while ((n = std::fread(chunk, 1, sizeof chunk, fp)) > 0) blob.insert(blob.end(), chunk, chunk + n);
-        std::fclose(fp);
+        ASSERT_TRUE(lumicor::test::ReadFileBytes(path, &blob));
         Meta parsed;
         const _VondResult r = VondParseMeta(static_cast<uint32_t>(blob.size()), blob.data(), &parsed.m);
         ASSERT_EQ(r.status, 0u) << r.function << ": " << r.message;

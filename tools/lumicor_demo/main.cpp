@@ -2,6 +2,7 @@
 // metas with fingers and a blur map, four attention areas), writes it as
 // DIR/demo.lmeta (DIR defaults to the current directory), reads the file
 // back, checks that the blob round-trips byte for byte and prints the meta.
+#include "testkit/files.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
@@ -16,24 +17,6 @@ int Fail(const char* what, const _VondResult& r) {
     std::fprintf(stderr, "lumicor_demo: %s: status %u in %s: %s\n", what, static_cast<unsigned>(r.status),
                  r.function ? r.function : "?", r.message ? r.message : "");
     return 1;
-}
-
-bool WriteFile(const std::string& path, const std::vector<uint8_t>& bytes) {
-    std::FILE* fp = std::fopen(path.c_str(), "wb");
-    if (!fp) return false;
-    const bool ok = std::fwrite(bytes.data(), 1, bytes.size(), fp) == bytes.size();
-    return std::fclose(fp) == 0 && ok;
-}
-
-bool ReadFile(const std::string& path, std::vector<uint8_t>* bytes) {
-    std::FILE* fp = std::fopen(path.c_str(), "rb");
-    if (!fp) return false;
-    uint8_t chunk[4096];
-    size_t n;
-    while ((n = std::fread(chunk, 1, sizeof chunk, fp)) > 0) bytes->insert(bytes->end(), chunk, chunk + n);
-    const bool ok = !std::ferror(fp);
-    std::fclose(fp);
-    return ok;
 }
 
 std::vector<uint8_t> Serialize(const _VondMeta& meta, _VondResult* result) {
@@ -64,14 +47,14 @@ int main(int argc, char** argv) {
     const std::vector<uint8_t> blob = Serialize(meta, &r);
     VondDisposeMeta(&meta);
     if (r.status != VOND_STATUS_OK) return Fail("serialise", r);
-    if (!WriteFile(path, blob)) {
+    if (!lumicor::test::WriteFileBytes(path, blob)) {
         std::fprintf(stderr, "lumicor_demo: cannot write %s\n", path.c_str());
         return 1;
     }
     std::printf("wrote %s (%zu bytes)\n", path.c_str(), blob.size());
 
     std::vector<uint8_t> stored;
-    if (!ReadFile(path, &stored)) {
+    if (!lumicor::test::ReadFileBytes(path, &stored)) {
         std::fprintf(stderr, "lumicor_demo: cannot read %s\n", path.c_str());
         return 1;
     }

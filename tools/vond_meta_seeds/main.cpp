@@ -4,6 +4,7 @@
 //   empty.lmeta       no faces, no fingers, no blur map, no areas
 //   face_areas.lmeta  the hand-made meta with face areas (one direction -1)
 //   meta_v6.lmeta     the hand-made meta under meta version 6
+#include "testkit/files.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
@@ -19,10 +20,7 @@ bool Write(const std::string& path, const _VondMeta& meta) {
     if (VondGetSerializedSize(&meta, &size).status != VOND_STATUS_OK) return false;
     std::vector<uint8_t> blob(size);
     if (VondSerializeMeta(&meta, size, blob.data()).status != VOND_STATUS_OK) return false;
-    std::FILE* fp = std::fopen(path.c_str(), "wb");
-    if (!fp) return false;
-    const bool ok = std::fwrite(blob.data(), 1, blob.size(), fp) == blob.size();
-    return std::fclose(fp) == 0 && ok;
+    return lumicor::test::WriteFileBytes(path, blob);
 }
 
 bool WriteAll(const std::string& dir) {

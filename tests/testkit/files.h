@@ -1,7 +1,9 @@
-// A temporary directory for tests that write files (configuration files,
-// debug images); removed with its contents when the object goes away.
-#ifndef LUMICOR_TESTKIT_TEMP_DIR_H
-#define LUMICOR_TESTKIT_TEMP_DIR_H
+// Files for tests and tools: a temporary directory for tests that write
+// files (configuration files, debug images), removed with its contents when
+// the object goes away, and whole-file reads and writes. No gtest here, so
+// tools may link it.
+#ifndef LUMICOR_TESTKIT_FILES_H
+#define LUMICOR_TESTKIT_FILES_H
 
 #include <cstdint>
 #include <string>
@@ -31,6 +33,8 @@ private:
 
 // Whole file as bytes; false when it cannot be read.
 bool ReadFileBytes(const std::string& path, std::vector<uint8_t>* bytes);
+// Replaces the file with `bytes`; false when it cannot be written completely.
+bool WriteFileBytes(const std::string& path, const std::vector<uint8_t>& bytes);
 
 }  // namespace test
 }  // namespace lumicor

@@ -1,4 +1,4 @@
-#include "testkit/temp_dir.h"
+#include "testkit/files.h"
 
 #include <dirent.h>
 #include <ftw.h>
@@ -30,10 +30,7 @@ std::string TempDir::File(const std::string& name) const { return path_ + "/" + 
 
 std::string TempDir::Write(const std::string& name, const std::string& text) const {
     const std::string full = File(name);
-    if (std::FILE* fp = std::fopen(full.c_str(), "wb")) {
-        std::fwrite(text.data(), 1, text.size(), fp);
-        std::fclose(fp);
-    }
+    WriteFileBytes(full, std::vector<uint8_t>(text.begin(), text.end()));
     return full;
 }
 
@@ -60,6 +57,13 @@ bool ReadFileBytes(const std::string& path, std::vector<uint8_t>* bytes) {
     const bool ok = !std::ferror(fp);
     std::fclose(fp);
     return ok;
+}
+
+bool WriteFileBytes(const std::string& path, const std::vector<uint8_t>& bytes) {
+    std::FILE* fp = std::fopen(path.c_str(), "wb");
+    if (!fp) return false;
+    const bool ok = std::fwrite(bytes.data(), 1, bytes.size(), fp) == bytes.size();
+    return std::fclose(fp) == 0 && ok;
 }
 
 }  // namespace test
