@@ -159,19 +159,28 @@ _VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEng
 /* Bytes of the three Kt frames, 0 on failure. */
 uint32_t VondKtLibGetSerializedSize(const _KtMetaSimilarity& similarity, const _KtMetaRepresentative& representative,
                                     const _KtMetaColorLabel& colorLabel);
+/* Writes the similarity, representative and colour label frames back to back
+ * into pBuf; written = their total size (0 on failure). 1 bufSize below the
+ * total, 3 a size or a frame cannot be written. */
 _VondResult VondKtLibSerialize(const _KtEngineVersion& simlEngine, const _KtMetaVersion& simlMeta,
                                const _KtMetaSimilarity& similarity, const _KtEngineVersion& repmEngine,
                                const _KtMetaVersion& repmMeta, const _KtMetaRepresentative& representative,
                                const _KtEngineVersion& clblEngine, const _KtMetaVersion& clblMeta,
                                const _KtMetaColorLabel& colorLabel, uint8_t* pBuf, uint32_t bufSize,
                                uint32_t& written);
+/* Reads the three frames from pBuf (bufSize: bytes to the end of the buffer)
+ * into the records, which receive copies of their own; consumed = bytes of
+ * the three frames. 2 out of memory, 3 a frame is refused (the message names
+ * it); on failure the representative's arrays are released. */
 _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersion& simlEngine,
                            _KtMetaVersion& simlMeta, _KtMetaSimilarity& similarity, _KtEngineVersion& repmEngine,
                            _KtMetaVersion& repmMeta, _KtMetaRepresentative& representative,
                            _KtEngineVersion& clblEngine, _KtMetaVersion& clblMeta, _KtMetaColorLabel& colorLabel,
                            uint32_t& consumed);
+/* Prints the three metas to standard output. */
 void VondKtLibDump(const _KtMetaSimilarity& similarity, const _KtMetaRepresentative& representative,
                    const _KtMetaColorLabel& colorLabel);
+/* Frees the representative's arrays and clears their pointers and counts. */
 void VondKtlibDisposeMeta(_KtMetaSimilarity& similarity, _KtMetaRepresentative& representative,
                           _KtMetaColorLabel& colorLabel);
 
