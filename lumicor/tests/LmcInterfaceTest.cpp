@@ -1,5 +1,5 @@
 // Start, stop and blob release of the exported interface.
-#include "testkit/files.h"
+#include "testkit/temp_dir.h"
 
 #include <lumicor/lmc.h>
 

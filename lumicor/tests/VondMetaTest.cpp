@@ -3,7 +3,7 @@
 // committed fuzz seeds and allocation failures.
 #include "lumicor/src/driver/vond_meta_sections.h"
 #include "testkit/fault.h"
-#include "testkit/files.h"
+#include "testkit/temp_dir.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
@@ -367,8 +367,9 @@ TEST(VondMetaTest, CommittedFuzzSeedsParseAndRoundTrip) {
         if (e->d_name[0] == '.') continue;
         const std::string path = dir + "/" + e->d_name;
         SCOPED_TRACE(path);
-        std::vector<uint8_t> blob;
-        ASSERT_TRUE(lumicor::test::ReadFileBytes(path, &blob));
+        const std::string bytes = lumicor::test::ReadFileBytes(path);
+        const std::vector<uint8_t> blob(bytes.begin(), bytes.end());
+        ASSERT_FALSE(blob.empty());
         Meta parsed;
         const _VondResult r = VondParseMeta(static_cast<uint32_t>(blob.size()), blob.data(), &parsed.m);
         ASSERT_EQ(r.status, 0u) << r.function << ": " << r.message;

@@ -2,12 +2,13 @@
 // metas with fingers and a blur map, four attention areas), writes it as
 // DIR/demo.lmeta (DIR defaults to the current directory), reads the file
 // back, checks that the blob round-trips byte for byte and prints the meta.
-#include "testkit/files.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
 
 #include <cstdio>
+#include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -47,17 +48,16 @@ int main(int argc, char** argv) {
     const std::vector<uint8_t> blob = Serialize(meta, &r);
     VondDisposeMeta(&meta);
     if (r.status != VOND_STATUS_OK) return Fail("serialise", r);
-    if (!lumicor::test::WriteFileBytes(path, blob)) {
-        std::fprintf(stderr, "lumicor_demo: cannot write %s\n", path.c_str());
+    std::ofstream(path, std::ios::binary).write(reinterpret_cast<const char*>(blob.data()),
+                                               static_cast<std::streamsize>(blob.size()));
+    std::ifstream in(path, std::ios::binary);
+    const std::vector<uint8_t> stored((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+    if (stored.size() != blob.size()) {
+        std::fprintf(stderr, "lumicor_demo: cannot write and read back %s\n", path.c_str());
         return 1;
     }
     std::printf("wrote %s (%zu bytes)\n", path.c_str(), blob.size());
 
-    std::vector<uint8_t> stored;
-    if (!lumicor::test::ReadFileBytes(path, &stored)) {
-        std::fprintf(stderr, "lumicor_demo: cannot read %s\n", path.c_str());
-        return 1;
-    }
     _VondMeta parsed;
     r = VondParseMeta(static_cast<uint32_t>(stored.size()), stored.data(), &parsed);
     if (r.status != VOND_STATUS_OK) {

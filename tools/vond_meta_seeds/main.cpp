@@ -4,12 +4,12 @@
 //   empty.lmeta       no faces, no fingers, no blur map, no areas
 //   face_areas.lmeta  the hand-made meta with face areas (one direction -1)
 //   meta_v6.lmeta     the hand-made meta under meta version 6
-#include "testkit/files.h"
 #include "testkit/meta_builder.h"
 
 #include <lumicor/vond.h>
 
 #include <cstdio>
+#include <fstream>
 #include <string>
 #include <vector>
 
@@ -20,7 +20,9 @@ bool Write(const std::string& path, const _VondMeta& meta) {
     if (VondGetSerializedSize(&meta, &size).status != VOND_STATUS_OK) return false;
     std::vector<uint8_t> blob(size);
     if (VondSerializeMeta(&meta, size, blob.data()).status != VOND_STATUS_OK) return false;
-    return lumicor::test::WriteFileBytes(path, blob);
+    std::ofstream out(path, std::ios::binary | std::ios::trunc);
+    out.write(reinterpret_cast<const char*>(blob.data()), static_cast<std::streamsize>(blob.size()));
+    return static_cast<bool>(out.flush());
 }
 
 bool WriteAll(const std::string& dir) {
