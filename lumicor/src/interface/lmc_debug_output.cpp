@@ -24,11 +24,6 @@ uint32_t s_debugImageCounter = 0;
 const zbm_PackedUchar kFaceColour = {{255, 0, 0, 0}};
 const zbm_PackedUchar kAreaColour = {{0, 0, 255, 0}};
 
-struct ImageDisposer {
-    void operator()(_zbm_Image* image) const { ZbiuDispose(&image); }
-};
-using ImagePtr = std::unique_ptr<_zbm_Image, ImageDisposer>;
-
 // Reads a [Debug] string of module Lumicor. Lookups build std::string values;
 // running out of memory there only means the setting cannot be read.
 bool ReadDebugSetting(const char* key, const char* defaultValue, std::string* value) {
@@ -48,20 +43,20 @@ bool IsFlagOn(const char* key) {
 
 // Private owning copy of the host photo (createZbmImage): the host's own order
 // for byte buffers, RGB for 32-bit ARGB words.
-ImagePtr CreateZbmImage(const LmcImage& host) {
+ZbmImagePtr CreateZbmImage(const LmcImage& host) {
     _zbm_PixelOrder order;
     if (vond::HostOrderToZbm(host.order, &order)) {
-        if (host.pBuf == nullptr) return ImagePtr();
-        ImagePtr copy(ZbiuCreateFromData(host.pBuf, host.width, host.height, host.pitch, order));
+        if (host.pBuf == nullptr) return ZbmImagePtr();
+        ZbmImagePtr copy(ZbiuCreateFromData(host.pBuf, host.width, host.height, host.pitch, order));
         if (!copy) LMC_LOG_ERROR("%s(%d): ZbiuCreateFromData() failed\n");
         return copy;
     }
-    if (host.order != vond::kHostOrderInt32Argb || host.pBufInt32 == nullptr) return ImagePtr();
+    if (host.order != vond::kHostOrderInt32Argb || host.pBufInt32 == nullptr) return ZbmImagePtr();
     if (host.pitch % 4 != 0) {
         LMC_LOG_ERROR("%s(%d): pImage->pitch %% 4 != 0\n");
-        return ImagePtr();
+        return ZbmImagePtr();
     }
-    ImagePtr copy(ZbiuCreate(host.width, host.height, ZBM_PIXEL_ORDER_RGB));
+    ZbmImagePtr copy(ZbiuCreate(host.width, host.height, ZBM_PIXEL_ORDER_RGB));
     if (!copy) {
         LMC_LOG_ERROR("%s(%d): ZbiuCreate() failed\n");
         return copy;
@@ -87,9 +82,9 @@ void DrawAnalysisResult(_zbm_Image* image, const _VondMeta& meta) {
 
     char text[32];
     std::snprintf(text, sizeof text, "face num: %u", static_cast<unsigned>(faceCount));
-    ZbiuDrawString(image, text, zbm_Pos{0, 0}, static_cast<_zbm_Alignment>(0), kFaceColour);
+    ZbiuDrawString(image, text, zbm_Pos{0, 0}, ZBM_ALIGNMENT_TOP_LEFT, kFaceColour);
     std::snprintf(text, sizeof text, "area num: %u", static_cast<unsigned>(areaCount));
-    ZbiuDrawString(image, text, zbm_Pos{0, 10}, static_cast<_zbm_Alignment>(0), kAreaColour);
+    ZbiuDrawString(image, text, zbm_Pos{0, 10}, ZBM_ALIGNMENT_TOP_LEFT, kAreaColour);
 
     for (uint32_t i = 0; i < faceCount; ++i) {
         const zbm_Rect box = meta.faceMeta.pRegions[i].faceArea;  // copied out of the packed record
@@ -142,7 +137,7 @@ uint32_t outputPpmImagesForDebug(const LmcImage* pImage, const _VondMeta* pMeta)
     if (!saveInput && !saveResult) return LMC_STATUS_OK;
     if (pImage == nullptr || pMeta == nullptr) return LMC_STATUS_FAILED;
 
-    ImagePtr copy = CreateZbmImage(*pImage);
+    ZbmImagePtr copy = CreateZbmImage(*pImage);
     if (!copy) {
         LMC_LOG_ERROR("%s(%d): createZbmImage(): failed\n");
         return LMC_STATUS_FAILED;
