@@ -46,12 +46,12 @@ std::vector<uint8_t> Serialize(const _CAAttentionAreaArray& areas, uint16_t w, u
     return buf;
 }
 
-TEST(VondCALibMetaTest, WritesTheSectionLayoutBigEndian) {
-    Areas areas(1, {Area(0.5f, 0.25f, 1.0f, 2.0f, 3), Area(0.0f, 0.0f, 0.0f, 0.0f, -1)});
+TEST(VondCALibMetaTest, WritesAndReadsTheSectionLayout) {
+    // isFace 5 is written as 1.
+    Areas areas(5, {Area(0.5f, 0.25f, 1.0f, 2.0f, 3), Area(0.0f, 0.0f, 0.0f, 0.0f, -1)});
     _VondResult r;
     const std::vector<uint8_t> bytes = Serialize(areas.array, 640, 480, &r);
     ASSERT_EQ(r.status, 0u) << r.message;
-    EXPECT_STREQ(r.function, "VondCALibSerialize");
     ASSERT_EQ(bytes.size(), 22u + 2 * 17u);
 
     std::vector<uint8_t> expected(16, 0);
@@ -64,69 +64,27 @@ TEST(VondCALibMetaTest, WritesTheSectionLayoutBigEndian) {
     };
     expected.insert(expected.end(), tail, tail + sizeof tail);
     EXPECT_EQ(bytes, expected);
-}
 
-TEST(VondCALibMetaTest, ParsesWhatItWrote) {
-    Areas areas(0, {Area(0.1f, 0.2f, 0.3f, 0.4f, 255), Area(0.9f, 0.8f, 0.05f, 0.0625f, 0),
-                    Area(0.5f, 0.5f, 0.5f, 0.5f, 17)});
-    _VondResult r;
-    const std::vector<uint8_t> bytes = Serialize(areas.array, 1234, 65535, &r);
-    ASSERT_EQ(r.status, 0u);
-
+    // Read back with trailing bytes that belong to whatever follows.
+    std::vector<uint8_t> longer = bytes;
+    longer.resize(bytes.size() + 9, 0x77);
     _CAAttentionAreaArray parsed{};
     _CALibVersion version;
     uint16_t w = 0, h = 0;
     uint32_t consumed = 0;
-    // Trailing bytes belong to whatever follows the section.
-    std::vector<uint8_t> longer = bytes;
-    longer.resize(bytes.size() + 9, 0x77);
     r = VondCALibParse(longer.data(), static_cast<uint32_t>(longer.size()), parsed, version, w, h, consumed);
     ASSERT_EQ(r.status, 0u) << r.message;
     EXPECT_EQ(consumed, bytes.size());
-    EXPECT_EQ(std::memcmp(version.text, Version("CALib 2.1.0").text, 16), 0);
-    EXPECT_EQ(w, 1234);
-    EXPECT_EQ(h, 65535);
-    EXPECT_EQ(parsed.isFace, 0u);
-    ASSERT_EQ(parsed.numAreas, 3u);
-    EXPECT_EQ(std::memcmp(parsed.pAreaArray, areas.records.data(), 3 * sizeof(CAAttentionArea)), 0);
+    EXPECT_EQ(std::memcmp(version.text, expected.data(), 16), 0);
+    EXPECT_EQ(w, 640);
+    EXPECT_EQ(h, 480);
+    EXPECT_EQ(parsed.isFace, 1u);
+    ASSERT_EQ(parsed.numAreas, 2u);
+    EXPECT_EQ(std::memcmp(&parsed.pAreaArray[0], &areas.records[0], sizeof(CAAttentionArea)), 0);
+    EXPECT_EQ(parsed.pAreaArray[1].val.direction, 255);  // the byte widened, not sign-extended
     VondCALibDisposeMeta(parsed);
     EXPECT_EQ(parsed.pAreaArray, nullptr);
     EXPECT_EQ(parsed.numAreas, 0u);
-}
-
-TEST(VondCALibMetaTest, ValueByteIsWidenedAndIsFaceNormalised) {
-    Areas areas(5, {Area(0, 0, 0, 0, -1)});
-    _VondResult r;
-    const std::vector<uint8_t> bytes = Serialize(areas.array, 1, 1, &r);
-    ASSERT_EQ(r.status, 0u);
-    EXPECT_EQ(bytes[16], 1);  // isFace != 0 is written as 1
-
-    _CAAttentionAreaArray parsed{};
-    _CALibVersion version;
-    uint16_t w, h;
-    uint32_t consumed;
-    ASSERT_EQ(VondCALibParse(bytes.data(), static_cast<uint32_t>(bytes.size()), parsed, version, w, h, consumed).status,
-              0u);
-    EXPECT_EQ(parsed.pAreaArray[0].val.direction, 255);
-    VondCALibDisposeMeta(parsed);
-}
-
-TEST(VondCALibMetaTest, NoAreasGiveTheTwentyTwoByteSection) {
-    _CAAttentionAreaArray none{};
-    EXPECT_EQ(VondCALibGetSerializedSize(none), 22u);
-    _VondResult r;
-    const std::vector<uint8_t> bytes = Serialize(none, 640, 480, &r);
-    ASSERT_EQ(r.status, 0u);
-    EXPECT_EQ(bytes.size(), 22u);
-
-    _CAAttentionAreaArray parsed{};
-    _CALibVersion version;
-    uint16_t w, h;
-    uint32_t consumed;
-    ASSERT_EQ(VondCALibParse(bytes.data(), 22, parsed, version, w, h, consumed).status, 0u);
-    EXPECT_EQ(parsed.numAreas, 0u);
-    EXPECT_EQ(parsed.pAreaArray, nullptr);
-    EXPECT_EQ(consumed, 22u);
 }
 
 TEST(VondCALibMetaTest, SerializeRefusals) {
@@ -213,8 +171,7 @@ TEST(VondCALibMetaTest, DumpPrintsEveryArea) {
     VondCALibDump(faces.array);
     VondCALibDump(salient.array);
     std::fflush(stdout);
-    const std::string out = testing::internal::GetCapturedStdout();
-    EXPECT_EQ(out,
+    EXPECT_EQ(testing::internal::GetCapturedStdout(),
               "\n*** VondCALibDump() ***\nisFace = true\nnumAreas = 1\n"
               "\t nx = 0.250000\n\t ny = 0.500000\n\t nw = 0.125000\n\t nh = 0.750000\n\t direction = -1\n"
               "\n*** VondCALibDump() ***\nisFace = false\nnumAreas = 1\n"

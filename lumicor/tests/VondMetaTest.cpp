@@ -82,9 +82,7 @@ TEST(VondMetaTest, HeaderAndFooterLayout) {
     const uint32_t q = VondKtLibGetSerializedSize(meta.m.similarity, meta.m.representative, meta.m.colorLabel);
     const uint32_t a = VondCALibGetSerializedSize(meta.m.attentionAreas);
     EXPECT_EQ(blob.size(), 32u + f + q + a);
-    EXPECT_EQ(a, 22u + 4 * 17u);
     EXPECT_EQ(Be32(blob, 28), 0x20003u);  // cluster subject opens the face section
-    EXPECT_EQ(Be32(blob, 32), 2u);        // score count
     EXPECT_EQ(std::memcmp(blob.data() + 28 + f, "SIML", 4), 0);
     EXPECT_EQ(std::memcmp(blob.data() + 28 + f + q, "CALib 2.1.0", 11), 0);
 }
@@ -165,55 +163,6 @@ TEST(VondMetaTest, ParseRefusesBrokenBlobs) {
         }
         EXPECT_TRUE(IsZeroMeta(parsed.m));
     }
-}
-
-TEST(VondMetaTest, ParseRefusesABlobWhoseSectionsAreCut) {
-    // A consistent header and footer around sections that end early: each
-    // section reader sees the shortage, and the record is left disposed.
-    const std::vector<uint8_t> good = HandMadeBlob();
-    for (uint32_t keep : {28u, 40u, 200u, static_cast<uint32_t>(good.size()) - 30u}) {
-        SCOPED_TRACE(keep);
-        std::vector<uint8_t> blob(good.begin(), good.begin() + keep);
-        blob.insert(blob.end(), {'D', 'N', 'O', 'V'});
-        const uint32_t total = static_cast<uint32_t>(blob.size());
-        blob[4] = static_cast<uint8_t>(total >> 24);
-        blob[5] = static_cast<uint8_t>(total >> 16);
-        blob[6] = static_cast<uint8_t>(total >> 8);
-        blob[7] = static_cast<uint8_t>(total);
-        Meta parsed;
-        const _VondResult r = VondParseMeta(total, blob.data(), &parsed.m);
-        EXPECT_NE(r.status, 0u);
-        EXPECT_TRUE(IsZeroMeta(parsed.m));
-    }
-}
-
-TEST(VondMetaTest, NullArguments) {
-    uint32_t size = 5;
-    _VondMeta meta;
-    std::memset(&meta, 0, sizeof meta);
-    uint8_t buf[64];
-    struct Case {
-        const char* name;
-        _VondResult r;
-        const char* message;
-    };
-    const Case cases[] = {
-        {"size of NULL", VondGetSerializedSize(nullptr, &size), "pMeta == NULL || pSizeOut == NULL"},
-        {"size into NULL", VondGetSerializedSize(&meta, nullptr), "pMeta == NULL || pSizeOut == NULL"},
-        {"serialise NULL", VondSerializeMeta(nullptr, 64, buf), "pMeta == NULL || bufSize == 0 || pBuf == NULL"},
-        {"serialise into NULL", VondSerializeMeta(&meta, 64, nullptr), "pMeta == NULL || bufSize == 0 || pBuf == NULL"},
-        {"serialise into 0 bytes", VondSerializeMeta(&meta, 0, buf), "pMeta == NULL || bufSize == 0 || pBuf == NULL"},
-        {"parse into NULL", VondParseMeta(64, buf, nullptr), "pMeta == NULL"},
-        {"parse NULL", VondParseMeta(64, nullptr, &meta), "bufSize == 0 || pBuf == NULL"},
-        {"dispose NULL", VondDisposeMeta(nullptr), "pMeta == NULL"},
-        {"dump NULL", VondDumpMeta(nullptr), "pMeta == NULL"},
-    };
-    for (const Case& c : cases) {
-        SCOPED_TRACE(c.name);
-        EXPECT_EQ(c.r.status, 1u);
-        EXPECT_STREQ(c.r.message, c.message);
-    }
-    EXPECT_EQ(size, 5u);
 }
 
 TEST(VondMetaTest, SerializeIntoATooSmallBufferLeavesItZeroed) {
@@ -343,15 +292,6 @@ TEST(VondMetaTest, DumpPrintsEverySection) {
     // Sections in the order face, quality, attention.
     EXPECT_LT(out.find("VondOrielDump"), out.find("VondKtLibDump"));
     EXPECT_LT(out.find("VondKtLibDump"), out.find("VondCALibDump"));
-}
-
-TEST(VondMetaTest, DisposeZeroesTheRecordAndToleratesAZeroedOne) {
-    Meta meta;
-    ASSERT_TRUE(BuildHandMadeMeta(&meta.m));
-    EXPECT_EQ(VondDisposeMeta(&meta.m).status, 0u);
-    EXPECT_TRUE(IsZeroMeta(meta.m));
-    EXPECT_EQ(VondDisposeMeta(&meta.m).status, 0u);
-    EXPECT_TRUE(IsZeroMeta(meta.m));
 }
 
 // The fuzz target's seeds are blobs of this library: they must stay readable
