@@ -43,6 +43,20 @@ _VondResult AttentionWrite(const _VondMeta& m, uint8_t* p, uint32_t n, uint32_t&
     return VondCALibSerialize(m.attentionAreas, m.caLibVersion, m.analyzedWidth, m.analyzedHeight, p, n, written);
 }
 
+// The section readers, in blob order.
+using SectionReader = _VondResult (*)(_VondMeta& m, const uint8_t* p, uint32_t n, uint32_t& consumed);
+_VondResult FaceRead(_VondMeta& m, const uint8_t* p, uint32_t n, uint32_t& consumed) {
+    return VondOrielParse(p, n, m.faceMeta, m.clusterSubject, m.faceMetaArray, consumed);
+}
+_VondResult QualityRead(_VondMeta& m, const uint8_t* p, uint32_t n, uint32_t& consumed) {
+    return VondKtLibParse(p, n, m.simlEngineVersion, m.simlMetaVersion, m.similarity, m.repmEngineVersion,
+                          m.repmMetaVersion, m.representative, m.clblEngineVersion, m.clblMetaVersion, m.colorLabel,
+                          consumed);
+}
+_VondResult AttentionRead(_VondMeta& m, const uint8_t* p, uint32_t n, uint32_t& consumed) {
+    return VondCALibParse(p, n, m.attentionAreas, m.caLibVersion, m.analyzedWidth, m.analyzedHeight, consumed);
+}
+
 const vond::MetaSections kDefaultSections = {
     {FaceSize, FaceWrite, "VondOrielGetSerializedSize() failed"},
     {QualitySize, QualityWrite, "VondKtLibGetSerializedSize() failed"},
@@ -183,26 +197,16 @@ _VondResult VondParseMeta(uint32_t bufSize, const uint8_t* pBuf, _VondMeta* pMet
     // compared with the total.
     auto disposeOnFailure = lmk::MakeScopeGuard([pMeta] { VondDisposeMeta(pMeta); });
     uint32_t offset = kHeaderSize;
-    uint32_t consumed = 0;
-    _VondResult section = VondOrielParse(pBuf + offset, bufSize - offset, pMeta->faceMeta, pMeta->clusterSubject,
-                                         pMeta->faceMetaArray, consumed);
-    if (section.status != VOND_STATUS_OK) return section;
-    if (consumed > bufSize - offset) return vond::Fail(result, VOND_STATUS_FAILED, "consumedSize > remainingBufSize");
-    offset += consumed;
-
-    consumed = 0;
-    section = VondKtLibParse(pBuf + offset, bufSize - offset, pMeta->simlEngineVersion, pMeta->simlMetaVersion,
-                             pMeta->similarity, pMeta->repmEngineVersion, pMeta->repmMetaVersion,
-                             pMeta->representative, pMeta->clblEngineVersion, pMeta->clblMetaVersion,
-                             pMeta->colorLabel, consumed);
-    if (section.status != VOND_STATUS_OK) return section;
-    if (consumed > bufSize - offset) return vond::Fail(result, VOND_STATUS_FAILED, "consumedSize > remainingBufSize");
-    offset += consumed;
-
-    consumed = 0;
-    section = VondCALibParse(pBuf + offset, bufSize - offset, pMeta->attentionAreas, pMeta->caLibVersion,
-                             pMeta->analyzedWidth, pMeta->analyzedHeight, consumed);
-    if (section.status != VOND_STATUS_OK) return section;
+    for (SectionReader read : {FaceRead, QualityRead, AttentionRead}) {
+        uint32_t consumed = 0;
+        const _VondResult section = read(*pMeta, pBuf + offset, bufSize - offset, consumed);
+        if (section.status != VOND_STATUS_OK) return section;
+        // A reader never reports more than it was given; the next section
+        // would start outside the buffer if one did.
+        if (consumed > bufSize - offset)
+            return vond::Fail(result, VOND_STATUS_FAILED, "consumedSize > remainingBufSize");
+        offset += consumed;
+    }
     disposeOnFailure.Dismiss();
     return result;
 }
