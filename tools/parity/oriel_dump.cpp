@@ -71,7 +71,10 @@ int Reference(const std::vector<uint8_t>& rgb, int w, int h) {
     all.h = h;
     oriel::Detection det[100];
     size_t n = 0;
-    if (!ssd.Detect(img, all, 512, 512, 0.5f, det, 100, &n)) return 1;
+    // ORIEL_SSD_INPUT="W H" overrides the 512 x 512 canvas (experiments).
+    int inW = 512, inH = 512;
+    if (const char* env = std::getenv("ORIEL_SSD_INPUT")) std::sscanf(env, "%d %d", &inW, &inH);
+    if (!ssd.Detect(img, all, inW, inH, 0.5f, det, 100, &n)) return 1;
     std::printf("{\"faces\": [");
     for (size_t i = 0; i < n; ++i) {
         Oriel_areaInfo f;

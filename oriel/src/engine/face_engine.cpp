@@ -133,9 +133,12 @@ bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, doub
     if (s > 2.0) s = 2.0;
     size_t n = 0;
     if (!Fast()) {
-        int inW = static_cast<int>(std::lround(crop.w * s)), inH = static_cast<int>(std::lround(crop.h * s));
-        if (inW < 32) inW = 32;
-        if (inH < 32) inH = 32;
+        // Sides in multiples of 32 keep every stride-2 layer on even sizes,
+        // the layout the detector was trained with.
+        int inW = static_cast<int>(std::lround(crop.w * s / 32.0)) * 32;
+        int inH = static_cast<int>(std::lround(crop.h * s / 32.0)) * 32;
+        if (inW < 64) inW = 64;
+        if (inH < 64) inH = 64;
         if (!ssd_.Detect(img, crop, inW, inH, ScoreThreshold(), out, maxOut, &n)) return false;
     } else {
         // Two square scales, the second 1.5 times the first, merged.

@@ -13,14 +13,16 @@ size_t SsdAnchorCount(const int* gridH, const int* gridW, int maps) {
 }
 
 void SsdAnchors(const int* gridH, const int* gridW, int maps, int inW, int inH, float* out) {
-    const double minScale = 0.2, maxScale = 0.95;
-    const double ref = static_cast<double>(inW > inH ? inW : inH);
-    const double fy = ref / inH, fx = ref / inW;
+    // The detector was trained on 512 x 512 inputs: anchor sizes and cell
+    // spacing are kept in those pixels whatever the input size, so that a
+    // face of a given pixel size meets the anchors it was trained with.
+    const double minScale = 0.2, maxScale = 0.95, trainedSide = 512.0;
     size_t k = 0;
-    for (int m = 0; m < maps; ++m) {
+    double stride = 16.0;
+    for (int m = 0; m < maps; ++m, stride *= 2.0) {
         const double s = minScale + (maxScale - minScale) * m / (maps - 1);
         const double sNext = m + 1 < maps ? minScale + (maxScale - minScale) * (m + 1) / (maps - 1) : 1.0;
-        double boxes[6][2];  // height, width
+        double boxes[6][2];  // height, width (fractions of the trained side)
         int nb = 0;
         if (m == 0) {
             const double spec[3][2] = {{0.1, 1.0}, {s, 2.0}, {s, 0.5}};
@@ -45,12 +47,16 @@ void SsdAnchors(const int* gridH, const int* gridW, int maps, int inW, int inH, 
                 }
             }
         }
+        // Cell spacing: the map's stride in pixels, or the map's share of
+        // the input when the map is smaller than the stride suggests.
+        const double sy = gridH[m] * stride >= inH ? stride : static_cast<double>(inH) / gridH[m];
+        const double sx = gridW[m] * stride >= inW ? stride : static_cast<double>(inW) / gridW[m];
         for (int y = 0; y < gridH[m]; ++y) {
-            const double cy = (y + 0.5) / gridH[m];
+            const double cy = (y + 0.5) * sy / inH;
             for (int x = 0; x < gridW[m]; ++x) {
-                const double cx = (x + 0.5) / gridW[m];
+                const double cx = (x + 0.5) * sx / inW;
                 for (int b = 0; b < nb; ++b) {
-                    const double h = boxes[b][0] * fy, w = boxes[b][1] * fx;
+                    const double h = boxes[b][0] * trainedSide / inH, w = boxes[b][1] * trainedSide / inW;
                     out[k++] = static_cast<float>(cy - h / 2);
                     out[k++] = static_cast<float>(cx - w / 2);
                     out[k++] = static_cast<float>(cy + h / 2);

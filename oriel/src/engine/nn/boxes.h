@@ -23,11 +23,12 @@ struct Candidate {
 // anchors per cell on the first, 6 on the others).
 size_t SsdAnchorCount(const int* gridH, const int* gridW, int maps);
 
-// Fills the SSD anchors [ymin, xmin, ymax, xmax] for an input of inW x inH
-// pixels: scales 0.2 .. 0.95 over the six maps (the first map uses 0.1 and
-// 0.2 with aspect ratios 1, 2, 1/2), the others aspect ratios 1, 2, 1/2, 3,
-// 1/3 plus one box of scale sqrt(s * s_next); sizes are relative to the
-// longer side of the input, cells centred at (i + 0.5) / grid.
+// Fills the SSD anchors [ymin, xmin, ymax, xmax] (fractions of the input)
+// for an input of inW x inH pixels and maps of strides 16, 32, .., 512:
+// scales 0.2 .. 0.95 of the trained 512-pixel side over the six maps (the
+// first map uses 0.1 and 0.2 with aspect ratios 1, 2, 1/2; the others 1, 2,
+// 1/2, 3, 1/3 plus one box of scale sqrt(s * s_next)), cell centres at
+// (i + 0.5) strides. On a 512 x 512 input these are the trained anchors.
 void SsdAnchors(const int* gridH, const int* gridW, int maps, int inW, int inH, float* out);
 
 // Decodes one SSD box encoding [ty, tx, th, tw] against its anchor.

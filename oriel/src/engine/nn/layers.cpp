@@ -28,35 +28,57 @@ inline float Activate(float v, Act act) {
 // checks.
 void PadInto(float* dst, const Tensor& in, int top, int left, int hp, int wp) {
     const size_t rowFloats = static_cast<size_t>(wp) * in.c;
-    std::memset(dst, 0, rowFloats * static_cast<size_t>(hp) * sizeof(float));
+    const size_t leftFloats = static_cast<size_t>(left) * in.c;
+    const size_t inFloats = static_cast<size_t>(in.w) * in.c;
+    const size_t rightFloats = rowFloats - leftFloats - inFloats;
+    std::memset(dst, 0, rowFloats * static_cast<size_t>(top) * sizeof(float));
     for (int y = 0; y < in.h; ++y) {
-        std::memcpy(dst + (static_cast<size_t>(y + top) * wp + left) * in.c, in.At(y, 0),
-                    static_cast<size_t>(in.w) * in.c * sizeof(float));
+        float* row = dst + static_cast<size_t>(y + top) * rowFloats;
+        std::memset(row, 0, leftFloats * sizeof(float));
+        std::memcpy(row + leftFloats, in.At(y, 0), inFloats * sizeof(float));
+        std::memset(row + leftFloats + inFloats, 0, rightFloats * sizeof(float));
     }
+    const int below = hp - top - in.h;
+    std::memset(dst + static_cast<size_t>(top + in.h) * rowFloats, 0, rowFloats * static_cast<size_t>(below) * sizeof(float));
 }
+
+// Four-float vectors (SSE on x86-64, NEON on ARM) through the compiler's
+// generic vector extension: element-wise multiply and add only, each
+// rounded on its own, so every target computes the same values.
+typedef float V4 __attribute__((vector_size(16)));
+typedef float V4u __attribute__((vector_size(16), aligned(4)));
+
+inline V4 Load(const float* p) { return *reinterpret_cast<const V4u*>(p); }
+inline void Store(float* p, V4 v) { *reinterpret_cast<V4u*>(p) = v; }
+inline V4 Splat(float a) { return V4{a, a, a, a}; }
 
 // P output pixels, one block of 8 output channels. x[p] points at the first
 // tap of pixel p; taps step by `rowStep` floats per kernel row and `cin` per
-// kernel column.
+// kernel column. Accumulators stay in registers: P x 2 vectors.
 template <int P>
 inline void ConvKernel(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
-                       float (&acc)[P][kBlock]) {
-    for (int p = 0; p < P; ++p)
-        for (int j = 0; j < kBlock; ++j) acc[p][j] = 0.0f;
+                       float (&out)[P][kBlock]) {
+    V4 acc[P][2];
+    for (int p = 0; p < P; ++p) acc[p][0] = acc[p][1] = Splat(0.0f);
     for (int ky = 0; ky < kh; ++ky) {
         for (int kx = 0; kx < kw; ++kx) {
             const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
-            const float* wt = w + (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
+            const float* wv = w + (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
             const float* xp[P];
             for (int p = 0; p < P; ++p) xp[p] = x[p] + tap;
-            for (int ci = 0; ci < cin; ++ci) {
-                const float* wv = wt + static_cast<size_t>(ci) * kBlock;
+            for (int ci = 0; ci < cin; ++ci, wv += kBlock) {
+                const V4 w0 = Load(wv), w1 = Load(wv + 4);
                 for (int p = 0; p < P; ++p) {
-                    const float a = xp[p][ci];
-                    for (int j = 0; j < kBlock; ++j) acc[p][j] += a * wv[j];
+                    const V4 a = Splat(xp[p][ci]);
+                    acc[p][0] += a * w0;
+                    acc[p][1] += a * w1;
                 }
             }
         }
+    }
+    for (int p = 0; p < P; ++p) {
+        Store(out[p], acc[p][0]);
+        Store(out[p] + 4, acc[p][1]);
     }
 }
 

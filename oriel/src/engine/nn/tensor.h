@@ -7,6 +7,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 
 #include "common/src/internal/memory.h"
 
@@ -69,7 +70,8 @@ public:
             if (need_[i] > (SIZE_MAX / sizeof(float)) - total - 16) return false;
             total += need_[i];
         }
-        mem_ = lmk::NewArray<float>(total + 16);
+        // Uninitialised: every layer writes its whole output before it is read.
+        mem_.reset(static_cast<float*>(std::malloc((total + 16) * sizeof(float))));
         if (!mem_) return false;
         float* p = mem_.get();
         // 64-byte alignment for the vector kernels.
@@ -86,7 +88,7 @@ private:
     bool planning_;
     size_t need_[kSlots];
     float* ptr_[kSlots];
-    lmk::UniqueArray<float> mem_;
+    lmk::MallocPtr<float> mem_;
 };
 
 }  // namespace nn
