@@ -300,8 +300,12 @@ const Oriel_verInfo* OrielPlus_GetOrielVersion(void);
 uint32_t OrielPlus_SetMaxOmpThreads(int32_t threads, OrielHandle handle);
 
 /* Detects the faces of the image into *pOut (a new engine-made array,
- * sorted by descending score; count 0 and NULL when none). What is filled
- * besides box and score follows the dictionary mode. */
+ * sorted by descending score; count 0 and NULL when none). The detector
+ * runs at the working pixel count; detections scoring between 0.3 x the
+ * threshold and the threshold (the best four) get a second look on a
+ * window twice their size at 128 x 128 and are kept, with the box of that
+ * look, only when it scores above the threshold. What is filled besides box
+ * and score follows the dictionary mode. */
 uint32_t OrielPlus_DetectFace(const uint8_t* pPixels, uint32_t width, uint32_t height, Oriel_InputColorMode mode,
                               int32_t stride, Oriel_faceAreaArray* pOut, OrielHandle handle);
 /* As OrielPlus_DetectFace, restricted to the given regions (each searched
@@ -338,8 +342,10 @@ uint32_t OrielPlus_AttributeClassify(const uint8_t* pPixels, uint32_t width, uin
                                      Oriel_InputColorMode mode, int32_t stride, Oriel_faceAreaArray* pFaces,
                                      OrielHandle handle);
 /* Makes the identity vector of one face into pOut->pVector (the caller's
- * buffer of OrielPlus_GetFaceVectorDim words): the face is aligned on its
- * eyes and mouth centre (located first when partLevels < 2). 3 face or out
+ * buffer of OrielPlus_GetFaceVectorDim words): the face is cropped on its
+ * eyes and mouth centre (located first when partLevels < 2) and described
+ * by the recognition network twice, as it is and mirrored; the vector is
+ * the normalised sum, so a face and its mirror image get one vector. 3 face or out
  * NULL, pOut->pVector NULL, or a box whose four values sum to 0; 1 when no
  * vector could be made (pOut->valid 0). */
 uint32_t OrielPlus_MakeFaceVector(const uint8_t* pPixels, uint32_t width, uint32_t height, Oriel_InputColorMode mode,
@@ -360,8 +366,10 @@ uint32_t OrielPlus_MakeFaceVectorEx(const uint8_t* pPixels, uint32_t width, uint
 uint32_t OrielPlus_CreateCacheBuffer(const uint8_t* pPixels, uint32_t width, uint32_t height,
                                      Oriel_InputColorMode mode, int32_t stride, OrielHandle handle);
 uint32_t OrielPlus_DisposeCacheBuffer(OrielHandle handle);
-/* Similarity of two made vectors in [0, 1]: (1 + cosine) / 2 of the two
- * descriptors. Runs without the lock (it only reads the vectors). 3 NULL
+/* Similarity of two made vectors in [0, 1]: the cosine of the two
+ * descriptors, negative values given as 0. On the networks' sample photos a
+ * face and its mirrored, rescaled or brightened copy score above 0.95 and
+ * two people of one photo below 0.93. Runs without the lock (it only reads the vectors). 3 NULL
  * arguments, 1 a vector that is not valid or not of this format. */
 uint32_t OrielPlus_CalcSimilarity(const Oriel_faceVectorData* pA, const Oriel_faceVectorData* pB, float* pOut,
                                   OrielHandle handle);

@@ -15,6 +15,8 @@ namespace {
 const size_t kMaxPerCrop = 100;   // detections kept per detector run
 const size_t kMaxDetections = 256;
 const int kLocalInput = 192;      // detector input side of the local search
+const int kVerifyInput = 128;     // detector input side of the second look
+const size_t kMaxVerify = 4;      // second looks per detection call
 const float kPi = 3.14159265358979f;
 
 float Clamp(float v, float lo, float hi) { return v < lo ? lo : (v > hi ? hi : v); }
@@ -121,13 +123,15 @@ void FaceEngine::SetLayers(const Oriel_engineConfigLayer* layers, uint32_t count
         if (layers[i].network < ORIEL_NET_COUNT) layers_[layers[i].network].enabled = layers[i].enabled ? 1 : 0;
 }
 
+float FaceEngine::VerifyFloor() const { return ScoreThreshold() * 0.3f; }
+
 float FaceEngine::ScoreThreshold() const {
     const float t = config_.scoreThreshold;
     return (t > 0.0f && t < 1.0f) ? t : 0.5f;
 }
 
-bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, double pixels, Detection* out,
-                            size_t maxOut, size_t* count) {
+bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, double pixels, float minScore,
+                            Detection* out, size_t maxOut, size_t* count) {
     *count = 0;
     double s = std::sqrt(pixels / (static_cast<double>(crop.w) * crop.h));
     if (s > 2.0) s = 2.0;
@@ -139,7 +143,7 @@ bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, doub
         int inH = static_cast<int>(std::lround(crop.h * s / 32.0)) * 32;
         if (inW < 64) inW = 64;
         if (inH < 64) inH = 64;
-        if (!ssd_.Detect(img, crop, inW, inH, ScoreThreshold(), out, maxOut, &n)) return false;
+        if (!ssd_.Detect(img, crop, inW, inH, minScore, out, maxOut, &n)) return false;
     } else {
         // Two square scales, the second 1.5 times the first, merged.
         const int longer = crop.w > crop.h ? crop.w : crop.h;
@@ -148,9 +152,9 @@ bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, doub
         if (side > 1024) side = 1024;
         Detection both[2 * kMaxPerCrop];
         size_t n1 = 0, n2 = 0;
-        if (!tiny_.Detect(img, crop, side, ScoreThreshold(), both, kMaxPerCrop, &n1)) return false;
+        if (!tiny_.Detect(img, crop, side, minScore, both, kMaxPerCrop, &n1)) return false;
         const int side2 = static_cast<int>(std::lround(side * 1.5 / 32.0)) * 32;
-        if (!tiny_.Detect(img, crop, side2 > 1024 ? 1024 : side2, ScoreThreshold(), both + n1, kMaxPerCrop, &n2))
+        if (!tiny_.Detect(img, crop, side2 > 1024 ? 1024 : side2, minScore, both + n1, kMaxPerCrop, &n2))
             return false;
         nn::Candidate cand[2 * kMaxPerCrop];
         for (size_t i = 0; i < n1 + n2; ++i) {
@@ -172,6 +176,51 @@ bool FaceEngine::DetectCrop(const nn::ImageView& img, const nn::Crop& crop, doub
     return true;
 }
 
+bool FaceEngine::Verify(const nn::ImageView& img, Detection* dets, size_t* n) {
+    const float threshold = ScoreThreshold();
+    size_t checked = 0, kept = 0;
+    Detection local[kMaxPerCrop];
+    for (size_t i = 0; i < *n; ++i) {
+        Detection d = dets[i];
+        if (d.score < threshold) {
+            // Candidates come sorted by score: only the best few are
+            // looked at again, the rest are dropped.
+            if (checked >= kMaxVerify) continue;
+            ++checked;
+            const double bw = static_cast<double>(d.w) * img.w, bh = static_cast<double>(d.h) * img.h;
+            const double side = 2.0 * (bw > bh ? bw : bh);
+            const nn::Crop c = ClipBox(static_cast<double>(d.x) * img.w + bw / 2 - side / 2,
+                                       static_cast<double>(d.y) * img.h + bh / 2 - side / 2, side, side, img.w, img.h);
+            if (c.w < 8 || c.h < 8) continue;
+            size_t got = 0;
+            if (!DetectCrop(img, c, static_cast<double>(kVerifyInput) * kVerifyInput, threshold, local, kMaxPerCrop, &got))
+                return false;
+            const nn::Box target = {d.y, d.x, d.y + d.h, d.x + d.w};
+            int best = -1;
+            for (size_t k = 0; k < got; ++k) {
+                const nn::Box b = {local[k].y, local[k].x, local[k].y + local[k].h, local[k].x + local[k].w};
+                if (nn::IoU(b, target) >= 0.3f && (best < 0 || local[k].score > local[best].score)) best = static_cast<int>(k);
+            }
+            if (best < 0) continue;
+            d = local[best];
+        }
+        dets[kept++] = d;
+    }
+    // A confirmed box may now coincide with another one: keep the better.
+    nn::Candidate cand[kMaxDetections];
+    for (size_t i = 0; i < kept; ++i) {
+        cand[i].box = {dets[i].y, dets[i].x, dets[i].y + dets[i].h, dets[i].x + dets[i].w};
+        cand[i].score = dets[i].score;
+        cand[i].index = static_cast<int>(i);
+    }
+    const size_t unique = nn::NonMaxSuppression(cand, kept, 0.5f, kMaxDetections);
+    Detection sorted[kMaxDetections];
+    for (size_t i = 0; i < unique; ++i) sorted[i] = dets[cand[i].index];
+    for (size_t i = 0; i < unique; ++i) dets[i] = sorted[i];
+    *n = unique;
+    return true;
+}
+
 bool FaceEngine::Detect(const nn::ImageView& img, const Oriel_searchArea* areas, uint32_t nAreas,
                         Oriel_faceAreaArray* out) {
     out->count = 0;
@@ -184,7 +233,7 @@ bool FaceEngine::Detect(const nn::ImageView& img, const Oriel_searchArea* areas,
         nn::Crop all;
         all.w = img.w;
         all.h = img.h;
-        if (!DetectCrop(img, all, work, dets.get(), kMaxPerCrop, &n)) return false;
+        if (!DetectCrop(img, all, work, VerifyFloor(), dets.get(), kMaxPerCrop, &n)) return false;
     } else {
         const double fullPixels = static_cast<double>(img.w) * img.h;
         for (uint32_t i = 0; i < nAreas && n < kMaxDetections; ++i) {
@@ -195,7 +244,8 @@ bool FaceEngine::Detect(const nn::ImageView& img, const Oriel_searchArea* areas,
             if (c.w < 8 || c.h < 8) continue;
             size_t k = 0;
             const size_t room = kMaxDetections - n < kMaxPerCrop ? kMaxDetections - n : kMaxPerCrop;
-            if (!DetectCrop(img, c, work * (static_cast<double>(c.w) * c.h) / fullPixels, dets.get() + n, room, &k))
+            if (!DetectCrop(img, c, work * (static_cast<double>(c.w) * c.h) / fullPixels, VerifyFloor(), dets.get() + n,
+                            room, &k))
                 return false;
             n += k;
         }
@@ -215,6 +265,7 @@ bool FaceEngine::Detect(const nn::ImageView& img, const Oriel_searchArea* areas,
         for (size_t i = 0; i < kept; ++i) dets[i] = merged[i];
         n = kept;
     }
+    if (!Verify(img, dets.get(), &n)) return false;
     // Drop faces below the minimum size, keep the best maxFaces.
     const uint32_t minPercent = config_.minFacePercent > 100 ? 100 : config_.minFacePercent;
     const double minSide = (img.w < img.h ? img.w : img.h) * (minPercent / 100.0);
@@ -269,7 +320,8 @@ bool FaceEngine::DetectLocal(const nn::ImageView& img, const Oriel_areaInfo* can
             const nn::Crop c = ClipBox(bx + bw / 2 - side / 2, by + bh / 2 - side / 2, side, side, img.w, img.h);
             if (c.w < 8 || c.h < 8) continue;
             size_t got = 0;
-            if (!DetectCrop(img, c, static_cast<double>(kLocalInput) * kLocalInput, dets.get() + nd, kMaxPerCrop, &got))
+            if (!DetectCrop(img, c, static_cast<double>(kLocalInput) * kLocalInput, ScoreThreshold(), dets.get() + nd,
+                            kMaxPerCrop, &got))
                 return false;
             nd += got;
         }
@@ -444,7 +496,8 @@ bool FaceEngine::Age(const nn::ImageView& img, const Landmarks& lm, float* age, 
     return age_.Run(img, c, age, male);
 }
 
-bool FaceEngine::Descriptor(const nn::ImageView& img, const Oriel_areaInfo& face, float* out, bool* aligned) {
+bool FaceEngine::Descriptor(const nn::ImageView& img, const Oriel_areaInfo& face, float* out, bool* aligned,
+                            bool mirrorAveraged) {
     const float bx = face.x * img.w, by = face.y * img.h, bw = face.width * img.w, bh = face.height * img.h;
     Oriel_areaInfo f = face;
     const bool hasParts = f.partLevels >= 2 && f.part2X > 0.0f && f.part2Y > 0.0f && f.rightEyeX >= 0.0f &&
@@ -464,7 +517,19 @@ bool FaceEngine::Descriptor(const nn::ImageView& img, const Oriel_areaInfo& face
     }
     if (!*aligned) c = ClipBox(bx, by, bw, bh, img.w, img.h);
     if (c.w <= 0 || c.h <= 0) return false;
-    return recognition_.Run(img, c, out);
+    if (!recognition_.Run(img, c, out)) return false;
+    if (!mirrorAveraged) return true;
+    float m[RecognitionNet::kDim];
+    if (!recognition_.Run(img, c, m, true)) return false;
+    double na = 0.0, nm = 0.0;
+    for (int i = 0; i < RecognitionNet::kDim; ++i) {
+        na += static_cast<double>(out[i]) * out[i];
+        nm += static_cast<double>(m[i]) * m[i];
+    }
+    if (!(na > 0.0) || !(nm > 0.0)) return false;
+    const float fa = static_cast<float>(1.0 / std::sqrt(na)), fm = static_cast<float>(1.0 / std::sqrt(nm));
+    for (int i = 0; i < RecognitionNet::kDim; ++i) out[i] = out[i] * fa + m[i] * fm;
+    return true;
 }
 
 bool FaceEngine::MakeVector(const nn::ImageView& img, const Oriel_areaInfo& face, Oriel_faceVectorData* out) {
@@ -472,7 +537,7 @@ bool FaceEngine::MakeVector(const nn::ImageView& img, const Oriel_areaInfo& face
     if ((config_.dictionaryMode & ORIEL_D_MODE_RECOGNITION) == 0) return false;
     float d[RecognitionNet::kDim];
     bool aligned = false;
-    if (!Descriptor(img, face, d, &aligned)) return false;
+    if (!Descriptor(img, face, d, &aligned, true)) return false;
     if (!PackVector(d, out->pVector)) return false;
     out->format = ORIEL_VECTOR_FORMAT;
     out->byteSize = ORIEL_VECTOR_BYTES;
@@ -523,8 +588,7 @@ float FaceEngine::Similarity(const float* a, const float* b) {
     }
     if (!(na > 0.0) || !(nb > 0.0)) return 0.0f;
     const double cosine = dot / std::sqrt(na * nb);
-    const double s = (1.0 + cosine) / 2.0;
-    return static_cast<float>(s < 0.0 ? 0.0 : (s > 1.0 ? 1.0 : s));
+    return static_cast<float>(cosine < 0.0 ? 0.0 : (cosine > 1.0 ? 1.0 : cosine));
 }
 
 float FaceEngine::Blur(const nn::ImageView& img, const Oriel_areaInfo& face) {

@@ -50,8 +50,12 @@ public:
     bool ClassifyAttributes(const nn::ImageView& img, Oriel_areaInfo* face);
     // Identity vector into out->pVector (ORIEL_VECTOR_BYTES bytes).
     bool MakeVector(const nn::ImageView& img, const Oriel_areaInfo& face, Oriel_faceVectorData* out);
-    // The raw 128-d descriptor (for tools and tests).
-    bool Descriptor(const nn::ImageView& img, const Oriel_areaInfo& face, float* out, bool* aligned);
+    // The 128-d descriptor of the network (mirrorAveraged false: as the
+    // network gives it; true: the sum of the unit descriptors of the crop
+    // and of its mirror image, which identity vectors use so that a face
+    // and its mirror image get the same vector).
+    bool Descriptor(const nn::ImageView& img, const Oriel_areaInfo& face, float* out, bool* aligned,
+                    bool mirrorAveraged = false);
 
     // Expression probabilities (7: neutral, happy, sad, angry, fearful,
     // disgusted, surprised) and age of a face whose landmarks are known.
@@ -70,9 +74,14 @@ public:
 private:
     bool Fast() const { return (config_.dictionaryMode & ORIEL_D_MODE_FAST_DETECTOR) != 0; }
     float ScoreThreshold() const;
+    float VerifyFloor() const;
     // Runs the configured detector on one crop; boxes relative to the photo.
-    bool DetectCrop(const nn::ImageView& img, const nn::Crop& crop, double pixels, Detection* out, size_t maxOut,
-                    size_t* count);
+    bool DetectCrop(const nn::ImageView& img, const nn::Crop& crop, double pixels, float minScore, Detection* out,
+                    size_t maxOut, size_t* count);
+    // Second look at detections scoring between the verification floor and
+    // the threshold: each is searched again at a higher resolution and
+    // kept (with the better box) only when confirmed.
+    bool Verify(const nn::ImageView& img, Detection* dets, size_t* n);
     // Fills the remaining fields of detected faces as the mode asks.
     bool Complete(const nn::ImageView& img, Oriel_areaInfo* faces, uint32_t n);
 

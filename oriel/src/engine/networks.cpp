@@ -405,7 +405,7 @@ bool RecognitionNet::Load(const nn::WeightBlob& blob) {
     return fc_.nin == 256 && fc_.nout == kDim;
 }
 
-bool RecognitionNet::Run(const nn::ImageView& img, const nn::Crop& crop, float* out) const {
+bool RecognitionNet::Run(const nn::ImageView& img, const nn::Crop& crop, float* out, bool mirror) const {
     if (crop.w <= 0 || crop.h <= 0) return false;
     const nn::Canvas cv = nn::SquareCanvas(crop, true);
     Arena a;
@@ -413,7 +413,18 @@ bool RecognitionNet::Run(const nn::ImageView& img, const nn::Crop& crop, float* 
     for (int pass = 0; pass < 2; ++pass) {
         const bool run = pass == 1;
         Tensor x = a.Take(kIn, 150, 150, 3);
-        if (run) nn::SampleCanvas(img, crop, cv, 150, 150, kFaceMean, 255.0f, x.d);
+        if (run) {
+            nn::SampleCanvas(img, crop, cv, 150, 150, kFaceMean, 255.0f, x.d);
+            if (mirror) {
+                for (int y = 0; y < 150; ++y)
+                    for (int l = 0, r = 149; l < r; ++l, --r)
+                        for (int c = 0; c < 3; ++c) {
+                            const float t = x.At(y, l)[c];
+                            x.At(y, l)[c] = x.At(y, r)[c];
+                            x.At(y, r)[c] = t;
+                        }
+            }
+        }
         Tensor t = nn::Conv2D(a, kS3, x, down_, 2, Pad::Valid, Act::Relu);
         Tensor cur = nn::MaxPool(a, kS2, t, 3, 2, Pad::Valid);
         for (int i = 0; i < 14; ++i) {

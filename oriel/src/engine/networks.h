@@ -104,8 +104,9 @@ class RecognitionNet {
 public:
     static const int kDim = 128;
     bool Load(const nn::WeightBlob& blob);
-    // The 128-dimensional face descriptor (not normalised).
-    bool Run(const nn::ImageView& img, const nn::Crop& crop, float* out) const;
+    // The 128-dimensional face descriptor (not normalised) of the crop, or
+    // of its mirror image.
+    bool Run(const nn::ImageView& img, const nn::Crop& crop, float* out, bool mirror = false) const;
 
 private:
     nn::ConvWeights down_;
