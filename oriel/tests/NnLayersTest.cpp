@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <cstring>
 #include <random>
 #include <vector>
 
@@ -83,6 +84,10 @@ TEST_P(ConvTest, MatchesDirectConvolution) {
     Tensor out = oriel::nn::Conv2D(a, 2, in, w, c.stride, c.pad, c.act);
     ASSERT_EQ(out.h, plan.h);
     ASSERT_EQ(out.w, plan.w);
+    // The portable kernels give the very same values as the widest ones.
+    const std::vector<float> best(out.d, out.d + out.Size());
+    Tensor portable = oriel::nn::Conv2D(a, 2, in, w, c.stride, c.pad, c.act, oriel::nn::KernelChoice::Portable);
+    ASSERT_EQ(std::memcmp(best.data(), portable.d, best.size() * sizeof(float)), 0);
 
     int ho, top, wo, left;
     oriel::nn::PadFor(c.h, c.k, c.stride, c.pad, &ho, &top);
@@ -113,7 +118,8 @@ INSTANTIATE_TEST_SUITE_P(
                       ConvCase{7, 13, 12, 20, 1, 1, Pad::Same, Act::None},     // pointwise, channel tail
                       ConvCase{10, 10, 8, 9, 3, 1, Pad::Same, Act::Leaky},     // padded 3x3
                       ConvCase{15, 15, 3, 8, 7, 2, Pad::Valid, Act::Relu},     // 7x7 stride 2 without padding
-                      ConvCase{6, 5, 16, 24, 1, 2, Pad::Same, Act::None}));   // strided 1x1 projection
+                      ConvCase{6, 5, 16, 24, 1, 2, Pad::Same, Act::None},      // strided 1x1 projection
+                      ConvCase{12, 19, 40, 25, 1, 1, Pad::Same, Act::None}));  // many pixels, channel tail
 
 TEST(NnLayersTest, DepthwiseMatchesDirectComputation) {
     for (int stride = 1; stride <= 2; ++stride) {
@@ -132,6 +138,9 @@ TEST(NnLayersTest, DepthwiseMatchesDirectComputation) {
         in = a.Take(1, h, w, c);
         std::copy(input.begin(), input.end(), in.d);
         Tensor out = oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, Act::Relu6);
+        const std::vector<float> best(out.d, out.d + out.Size());
+        oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, Act::Relu6, oriel::nn::KernelChoice::Portable);
+        ASSERT_EQ(std::memcmp(best.data(), out.d, best.size() * sizeof(float)), 0);
         int ho, top, wo, left;
         oriel::nn::PadFor(h, 3, stride, Pad::Same, &ho, &top);
         oriel::nn::PadFor(w, 3, stride, Pad::Same, &wo, &left);

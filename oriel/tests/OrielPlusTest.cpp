@@ -22,6 +22,11 @@ protected:
         ASSERT_EQ(OrielPlus_Initialize(&engine_), 0u);
         ASSERT_NE(engine_, nullptr);
         pixels_.assign(160 * 120 * 3, 128);
+        // A small detector input keeps these interface checks quick.
+        Oriel_engineConfig c;
+        ASSERT_EQ(OrielPlus_GetEngineConfig(&c, engine_), 0u);
+        c.workPixels = 4096;
+        ASSERT_EQ(OrielPlus_SetEngineConfig(&c, engine_), 0u);
     }
     void TearDown() override {
         if (engine_) {
@@ -269,8 +274,15 @@ TEST_F(OrielPlusTest, ClusterCodes) {
 TEST_F(OrielPlusTest, ConfigurationLayersAndVersions) {
     Oriel_engineConfig c;
     ASSERT_EQ(OrielPlus_GetEngineConfig(&c, engine_), 0u);
-    EXPECT_EQ(c.workPixels, 76800u);
+    EXPECT_EQ(c.workPixels, 4096u);  // as the fixture set it
     EXPECT_EQ(c.dictionaryMode, 7u);
+    OrielHandle fresh = nullptr;
+    ASSERT_EQ(OrielPlus_Initialize(&fresh), 0u);
+    Oriel_engineConfig defaults;
+    ASSERT_EQ(OrielPlus_GetEngineConfig(&defaults, fresh), 0u);
+    EXPECT_EQ(defaults.workPixels, 76800u);
+    EXPECT_EQ(defaults.minFacePercent, 2u);
+    EXPECT_EQ(OrielPlus_Finalize(&fresh), 0u);
     c.flags = 0x107E01F1u;
     c.reserved14 = 99;
     ASSERT_EQ(OrielPlus_SetEngineConfig(&c, engine_), 0u);

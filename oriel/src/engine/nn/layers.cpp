@@ -2,13 +2,16 @@
 
 #include <cstring>
 
+#if defined(__x86_64__) || defined(__i386__)
+#include <immintrin.h>
+#endif
+
 namespace oriel {
 namespace nn {
 
 namespace {
 
 const int kBlock = 8;  // output channels per weight block (see weights.h)
-const int kPixels = 4;  // output pixels computed together
 
 inline float Activate(float v, Act act) {
     switch (act) {
@@ -42,24 +45,46 @@ void PadInto(float* dst, const Tensor& in, int top, int left, int hp, int wp) {
     std::memset(dst + static_cast<size_t>(top + in.h) * rowFloats, 0, rowFloats * static_cast<size_t>(below) * sizeof(float));
 }
 
-// Four-float vectors (SSE on x86-64, NEON on ARM) through the compiler's
-// generic vector extension: element-wise multiply and add only, each
-// rounded on its own, so every target computes the same values.
-typedef float V4 __attribute__((vector_size(16)));
-typedef float V4u __attribute__((vector_size(16), aligned(4)));
+// Vectors through the compiler's generic vector extension (SSE or AVX2 on
+// x86-64, NEON on ARM): element-wise multiply and add only, each rounded
+// on its own, and every output channel accumulates over taps and input
+// channels in the same order whatever the vector width. So every build and
+// every kernel variant computes the same values.
+#define ORIEL_INLINE inline __attribute__((always_inline))
+#if defined(__GNUC__) && !defined(__clang__)
+// The 8-float helpers are only ever inlined into the AVX2 variants; no
+// out-of-line copy with an AVX argument exists.
+#pragma GCC diagnostic ignored "-Wpsabi"
+#endif
 
-inline V4 Load(const float* p) { return *reinterpret_cast<const V4u*>(p); }
-inline void Store(float* p, V4 v) { *reinterpret_cast<V4u*>(p) = v; }
-inline V4 Splat(float a) { return V4{a, a, a, a}; }
+template <int W>
+struct Vec {
+    typedef float T __attribute__((vector_size(W * 4)));
+    typedef float U __attribute__((vector_size(W * 4), aligned(4)));
+    static ORIEL_INLINE T Load(const float* p) { return *reinterpret_cast<const U*>(p); }
+    static ORIEL_INLINE void Store(float* p, T v) { *reinterpret_cast<U*>(p) = v; }
+    static ORIEL_INLINE T Splat(float a);
+};
+template <>
+ORIEL_INLINE Vec<4>::T Vec<4>::Splat(float a) {
+    return T{a, a, a, a};
+}
+template <>
+ORIEL_INLINE Vec<8>::T Vec<8>::Splat(float a) {
+    return T{a, a, a, a, a, a, a, a};
+}
 
-// P output pixels, one block of 8 output channels. x[p] points at the first
-// tap of pixel p; taps step by `rowStep` floats per kernel row and `cin` per
-// kernel column. Accumulators stay in registers: P x 2 vectors.
-template <int P>
-inline void ConvKernel(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
-                       float (&out)[P][kBlock]) {
-    V4 acc[P][2];
-    for (int p = 0; p < P; ++p) acc[p][0] = acc[p][1] = Splat(0.0f);
+// P output pixels, one block of 8 output channels (8 / W vectors). x[p]
+// points at the first tap of pixel p; taps step by `rowStep` floats per
+// kernel row and `cin` per kernel column. Accumulators stay in registers.
+template <int W, int P>
+ORIEL_INLINE void ConvKernel(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
+                             float (&out)[P][kBlock]) {
+    typedef Vec<W> V;
+    const int NV = kBlock / W;
+    typename V::T acc[P][NV];
+    for (int p = 0; p < P; ++p)
+        for (int v = 0; v < NV; ++v) acc[p][v] = V::Splat(0.0f);
     for (int ky = 0; ky < kh; ++ky) {
         for (int kx = 0; kx < kw; ++kx) {
             const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
@@ -67,26 +92,161 @@ inline void ConvKernel(const float* const* x, size_t rowStep, int kh, int kw, in
             const float* xp[P];
             for (int p = 0; p < P; ++p) xp[p] = x[p] + tap;
             for (int ci = 0; ci < cin; ++ci, wv += kBlock) {
-                const V4 w0 = Load(wv), w1 = Load(wv + 4);
+                typename V::T wt[NV];
+                for (int v = 0; v < NV; ++v) wt[v] = V::Load(wv + v * W);
                 for (int p = 0; p < P; ++p) {
-                    const V4 a = Splat(xp[p][ci]);
-                    acc[p][0] += a * w0;
-                    acc[p][1] += a * w1;
+                    const typename V::T a = V::Splat(xp[p][ci]);
+                    for (int v = 0; v < NV; ++v) acc[p][v] += a * wt[v];
                 }
             }
         }
     }
-    for (int p = 0; p < P; ++p) {
-        Store(out[p], acc[p][0]);
-        Store(out[p] + 4, acc[p][1]);
-    }
+    for (int p = 0; p < P; ++p)
+        for (int v = 0; v < NV; ++v) V::Store(out[p] + v * W, acc[p][v]);
 }
 
+struct PortableKernel {
+    template <int P>
+    static ORIEL_INLINE void Run(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
+                                 float (&out)[P][kBlock]) {
+        ConvKernel<4, P>(x, rowStep, kh, kw, cin, w, out);
+    }
+};
+
 template <int P>
-inline void StoreBlock(float* const* out, const float (&acc)[P][kBlock], const float* bias, int n, Act act) {
+ORIEL_INLINE void StoreBlock(float* const* out, const float (&acc)[P][kBlock], const float* bias, int n, Act act) {
     for (int p = 0; p < P; ++p)
         for (int j = 0; j < n; ++j) out[p][j] = Activate(acc[p][j] + bias[j], act);
 }
+
+struct ConvJob {
+    const float* src;  // input (padded when needed)
+    size_t rowStep;    // floats per input row
+    int cin, ho, wo, stride;
+    bool flat;         // 1x1 stride 1 without padding: one list of pixels
+    const ConvWeights* w;
+    float* out;
+    Act act;
+};
+
+template <class K, int P>
+ORIEL_INLINE void ConvLoops(const ConvJob& j) {
+    const ConvWeights& w = *j.w;
+    const int blocks = (w.cout + kBlock - 1) / kBlock;
+    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
+    for (int cb = 0; cb < blocks; ++cb) {
+        const float* wb = w.w + cb * blockFloats;
+        const float* bias = w.b + cb * kBlock;
+        const int n = (w.cout - cb * kBlock) < kBlock ? (w.cout - cb * kBlock) : kBlock;
+        // Rows of output pixels; a flat job is one row of ho * wo pixels.
+        const int rows = j.flat ? 1 : j.ho;
+        const int cols = j.flat ? j.ho * j.wo : j.wo;
+        const int step = j.flat ? 1 : j.stride;
+        for (int oy = 0; oy < rows; ++oy) {
+            const float* row = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep;
+            float* orow = j.out + static_cast<size_t>(oy) * cols * w.cout + cb * kBlock;
+            int ox = 0;
+            for (; ox + P <= cols; ox += P) {
+                const float* x[P];
+                float* o[P];
+                for (int k = 0; k < P; ++k) {
+                    x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
+                    o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
+                }
+                float acc[P][kBlock];
+                K::template Run<P>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
+                StoreBlock<P>(o, acc, bias, n, j.act);
+            }
+            for (; ox < cols; ++ox) {
+                const float* x[1] = {row + static_cast<size_t>(ox) * step * j.cin};
+                float* o[1] = {orow + static_cast<size_t>(ox) * w.cout};
+                float acc[1][kBlock];
+                K::template Run<1>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
+                StoreBlock<1>(o, acc, bias, n, j.act);
+            }
+        }
+    }
+}
+
+struct DepthwiseJob {
+    const float* src;
+    size_t rowStep;
+    int c, ho, wo, stride;
+    const DepthwiseWeights* w;
+    float* out;
+    Act act;
+};
+
+template <int W>
+ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
+    typedef Vec<W> V;
+    const DepthwiseWeights& w = *j.w;
+    const int c = j.c;
+    const int cv = c - c % W;
+    for (int oy = 0; oy < j.ho; ++oy) {
+        for (int ox = 0; ox < j.wo; ++ox) {
+            float* o = j.out + (static_cast<size_t>(oy) * j.wo + ox) * c;
+            const float* base = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * c;
+            int ch = 0;
+            for (; ch < cv; ch += W) {
+                typename V::T acc = V::Splat(0.0f);
+                for (int ky = 0; ky < w.kh; ++ky)
+                    for (int kx = 0; kx < w.kw; ++kx)
+                        acc += V::Load(base + ky * j.rowStep + static_cast<size_t>(kx) * c + ch) *
+                               V::Load(w.w + (static_cast<size_t>(ky) * w.kw + kx) * c + ch);
+                V::Store(o + ch, acc);
+            }
+            for (; ch < c; ++ch) {
+                float acc = 0.0f;
+                for (int ky = 0; ky < w.kh; ++ky)
+                    for (int kx = 0; kx < w.kw; ++kx)
+                        acc += base[ky * j.rowStep + static_cast<size_t>(kx) * c + ch] *
+                               w.w[(static_cast<size_t>(ky) * w.kw + kx) * c + ch];
+                o[ch] = acc;
+            }
+            for (ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], j.act);
+        }
+    }
+}
+
+void ConvPortable(const ConvJob& j) { ConvLoops<PortableKernel, 4>(j); }
+void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<4>(j); }
+
+#if defined(__x86_64__) || defined(__i386__)
+// Eight-float AVX2 variants, chosen at run time; same values as above.
+// One 8-float register per block of output channels, the input values
+// broadcast from memory; multiply and add stay separate instructions.
+struct Avx2Kernel {
+    template <int P>
+    static __attribute__((target("avx2"))) inline void Run(const float* const* x, size_t rowStep, int kh,
+                                                                          int kw, int cin, const float* w,
+                                                                          float (&out)[P][kBlock]) {
+        __m256 acc[P];
+        for (int p = 0; p < P; ++p) acc[p] = _mm256_setzero_ps();
+        for (int ky = 0; ky < kh; ++ky) {
+            for (int kx = 0; kx < kw; ++kx) {
+                const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
+                const float* wv = w + (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
+                const float* xp[P];
+                for (int p = 0; p < P; ++p) xp[p] = x[p] + tap;
+                for (int ci = 0; ci < cin; ++ci, wv += kBlock) {
+                    const __m256 wt = _mm256_loadu_ps(wv);
+                    for (int p = 0; p < P; ++p)
+                        acc[p] = _mm256_add_ps(acc[p], _mm256_mul_ps(_mm256_broadcast_ss(xp[p] + ci), wt));
+                }
+            }
+        }
+        for (int p = 0; p < P; ++p) _mm256_storeu_ps(out[p], acc[p]);
+    }
+};
+__attribute__((target("avx2"), flatten)) void ConvAvx2(const ConvJob& j) { ConvLoops<Avx2Kernel, 8>(j); }
+__attribute__((target("avx2"))) void DepthwiseAvx2(const DepthwiseJob& j) { DepthwiseLoops<8>(j); }
+bool UseAvx2(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
+#else
+void ConvAvx2(const ConvJob& j) { ConvPortable(j); }
+void DepthwiseAvx2(const DepthwiseJob& j) { DepthwisePortable(j); }
+bool UseAvx2(KernelChoice) { return false; }
+#endif
 
 }  // namespace
 
@@ -103,7 +263,8 @@ void PadFor(int in, int k, int stride, Pad pad, int* out, int* before) {
     *before = total / 2;
 }
 
-Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act) {
+Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act,
+              KernelChoice kernels) {
     int ho, wo, top, left;
     PadFor(in.h, w.kh, stride, pad, &ho, &top);
     PadFor(in.w, w.kw, stride, pad, &wo, &left);
@@ -124,67 +285,26 @@ Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int st
         src = pbuf;
         srcW = wAlloc;
     }
-    const size_t rowStep = static_cast<size_t>(srcW) * in.c;
-    const int blocks = (w.cout + kBlock - 1) / kBlock;
-    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
-    const bool flat = w.kh == 1 && w.kw == 1 && stride == 1 && !padded;
-
-    for (int cb = 0; cb < blocks; ++cb) {
-        const float* wb = w.w + cb * blockFloats;
-        const float* bias = w.b + cb * kBlock;
-        const int n = (w.cout - cb * kBlock) < kBlock ? (w.cout - cb * kBlock) : kBlock;
-        if (flat) {
-            // 1x1 stride 1: the image is one list of pixels.
-            const int total = ho * wo;
-            int p = 0;
-            for (; p + kPixels <= total; p += kPixels) {
-                const float* x[kPixels];
-                float* o[kPixels];
-                for (int k = 0; k < kPixels; ++k) {
-                    x[k] = src + static_cast<size_t>(p + k) * in.c;
-                    o[k] = out.d + static_cast<size_t>(p + k) * w.cout + cb * kBlock;
-                }
-                float acc[kPixels][kBlock];
-                ConvKernel<kPixels>(x, 0, 1, 1, in.c, wb, acc);
-                StoreBlock<kPixels>(o, acc, bias, n, act);
-            }
-            for (; p < total; ++p) {
-                const float* x[1] = {src + static_cast<size_t>(p) * in.c};
-                float* o[1] = {out.d + static_cast<size_t>(p) * w.cout + cb * kBlock};
-                float acc[1][kBlock];
-                ConvKernel<1>(x, 0, 1, 1, in.c, wb, acc);
-                StoreBlock<1>(o, acc, bias, n, act);
-            }
-            continue;
-        }
-        for (int oy = 0; oy < ho; ++oy) {
-            const float* row = src + static_cast<size_t>(oy) * stride * rowStep;
-            float* orow = out.d + static_cast<size_t>(oy) * wo * w.cout + cb * kBlock;
-            int ox = 0;
-            for (; ox + kPixels <= wo; ox += kPixels) {
-                const float* x[kPixels];
-                float* o[kPixels];
-                for (int k = 0; k < kPixels; ++k) {
-                    x[k] = row + static_cast<size_t>(ox + k) * stride * in.c;
-                    o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
-                }
-                float acc[kPixels][kBlock];
-                ConvKernel<kPixels>(x, rowStep, w.kh, w.kw, in.c, wb, acc);
-                StoreBlock<kPixels>(o, acc, bias, n, act);
-            }
-            for (; ox < wo; ++ox) {
-                const float* x[1] = {row + static_cast<size_t>(ox) * stride * in.c};
-                float* o[1] = {orow + static_cast<size_t>(ox) * w.cout};
-                float acc[1][kBlock];
-                ConvKernel<1>(x, rowStep, w.kh, w.kw, in.c, wb, acc);
-                StoreBlock<1>(o, acc, bias, n, act);
-            }
-        }
-    }
+    ConvJob job;
+    job.src = src;
+    job.rowStep = static_cast<size_t>(srcW) * in.c;
+    job.cin = in.c;
+    job.ho = ho;
+    job.wo = wo;
+    job.stride = stride;
+    job.flat = w.kh == 1 && w.kw == 1 && stride == 1 && !padded;
+    job.w = &w;
+    job.out = out.d;
+    job.act = act;
+    if (UseAvx2(kernels))
+        ConvAvx2(job);
+    else
+        ConvPortable(job);
     return out;
 }
 
-Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w, int stride, Pad pad, Act act) {
+Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w, int stride, Pad pad, Act act,
+                 KernelChoice kernels) {
     int ho, wo, top, left;
     PadFor(in.h, w.kh, stride, pad, &ho, &top);
     PadFor(in.w, w.kw, stride, pad, &wo, &left);
@@ -204,23 +324,20 @@ Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w
         src = pbuf;
         srcW = wAlloc;
     }
-    const int c = in.c;
-    const size_t rowStep = static_cast<size_t>(srcW) * c;
-    for (int oy = 0; oy < ho; ++oy) {
-        for (int ox = 0; ox < wo; ++ox) {
-            float* o = out.At(oy, ox);
-            for (int ch = 0; ch < c; ++ch) o[ch] = 0.0f;
-            const float* base = src + static_cast<size_t>(oy) * stride * rowStep + static_cast<size_t>(ox) * stride * c;
-            for (int ky = 0; ky < w.kh; ++ky) {
-                for (int kx = 0; kx < w.kw; ++kx) {
-                    const float* x = base + ky * rowStep + static_cast<size_t>(kx) * c;
-                    const float* wt = w.w + (static_cast<size_t>(ky) * w.kw + kx) * c;
-                    for (int ch = 0; ch < c; ++ch) o[ch] += x[ch] * wt[ch];
-                }
-            }
-            for (int ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], act);
-        }
-    }
+    DepthwiseJob job;
+    job.src = src;
+    job.rowStep = static_cast<size_t>(srcW) * in.c;
+    job.c = in.c;
+    job.ho = ho;
+    job.wo = wo;
+    job.stride = stride;
+    job.w = &w;
+    job.out = out.d;
+    job.act = act;
+    if (UseAvx2(kernels))
+        DepthwiseAvx2(job);
+    else
+        DepthwisePortable(job);
     return out;
 }
 

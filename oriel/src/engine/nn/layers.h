@@ -22,8 +22,15 @@ enum class Pad { Same, Valid };
 // Output size and leading padding of one axis.
 void PadFor(int in, int k, int stride, Pad pad, int* out, int* before);
 
-Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act);
-Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w, int stride, Pad pad, Act act);
+// Kernel variants: Best picks the widest vectors the processor has (AVX2
+// on x86-64 when present); Portable forces the 4-float kernels. Both give
+// identical results.
+enum class KernelChoice { Best, Portable };
+
+Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act,
+              KernelChoice kernels = KernelChoice::Best);
+Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w, int stride, Pad pad, Act act,
+                 KernelChoice kernels = KernelChoice::Best);
 // Max pooling; with Same padding only the values inside the image count.
 Tensor MaxPool(Arena& a, int slot, const Tensor& in, int k, int stride, Pad pad);
 // Average pooling without padding.
