@@ -74,6 +74,31 @@ typedef struct _CAResult {
 
 /* CA_FUNCTIONS: the attention and framing entry points are declared below. */
 
+/* Writes the default framing parameters into *pParam: composition_mode 4
+ * (importance-weighted composition of all areas), aspect_ratio 1.0,
+ * magnification_limit 10.0, consistency_weight_min 0.1, force_main_number
+ * CA_NONE_SPECIFIED. Returns 0, or 3 for a null pointer. */
+uint32_t CAGetDefaultParam(_CAParam* pParam);
+
+/* Chooses the crop of shape pParam->aspect_ratio (height / width in pixels)
+ * that best composes the attention areas of a width x height photo, and
+ * writes it to *pResult as fractions of the photo. Only the areas are read,
+ * never pixels; only the first 16 areas count. The caller owns all records;
+ * nothing is kept between calls, and calls on different records may run
+ * concurrently. The same inputs give the same bits on every device.
+ *
+ * Returns 0 on success; 3 for invalid parameters (a side below 240 or above
+ * 2^24 pixels, a null pointer, aspect_ratio outside 0.1..10,
+ * magnification_limit outside 1..100, a non-finite consistency_weight_min,
+ * force_main_number neither CA_NONE_SPECIFIED nor the index of one of the
+ * first 16 areas, an area with a coordinate that is not a finite number
+ * within +-64, or areas announced without records), with *pResult untouched;
+ * 4 when memory runs out (*pResult untouched); 12 when no proper crop inside
+ * the photo results (*pResult written, but not to be used). Every failure
+ * prints one line on standard error. */
+uint32_t CASearchFraming(uint32_t width, uint32_t height, const _CAParam* pParam,
+                         const _CAAttentionAreaArray* pAttentionAreaArray, _CAResult* pResult);
+
 #ifdef __cplusplus
 } /* extern "C" */
 #endif

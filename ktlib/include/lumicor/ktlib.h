@@ -109,7 +109,8 @@ struct _KtFinger {
 };
 
 /* Quality judgement of a photo. Scores are -1.0 (not measured) or in [0, 1].
- * The record owns pFingers (and each finger's points) and pBlurMap. */
+ * The record owns pFingers (and each finger's points) and pBlurMap, all
+ * allocated with array new (KtRepmDisposeMeta releases them with delete[]). */
 struct _KtMetaRepresentative {
     float colorVariation;
     float badExposure;
@@ -138,11 +139,11 @@ extern "C" {
 /* ---- similarity meta ("SIML", meta version 2.0) ---- */
 /* Fills both versions; 2 when either pointer is NULL. */
 int KtSimlGetVersion(_KtMetaVersion* meta, _KtEngineVersion* engine);
-/* Copies *src into a new record in *out (which must be NULL: else 2). */
+/* Copies *src into a new record in *out (which must be NULL: else 2); 4 out of memory. */
 int KtSimlCloneMeta(const _KtMetaSimilarity* src, _KtMetaSimilarity** out);
 /* Frees *m and sets it to NULL; NULL m or *m is ignored. */
 int KtSimlDisposeMeta(_KtMetaSimilarity** m);
-/* Prints the meta to stream; does nothing when either is NULL. */
+/* Prints the meta to stream; does nothing when either is NULL. Returns 0. */
 int KtSimlDump(const _KtMetaSimilarity* m, FILE* stream);
 /* Stores 676 (16 + 660). */
 int KtSimlGetSerializedSize(unsigned int* size);
@@ -151,29 +152,39 @@ int KtSimlSerialize(const _KtMetaVersion* metaVersion, const _KtEngineVersion* e
                     const _KtMetaSimilarity* m, unsigned char* buffer, unsigned int length);
 /* Reads one frame into a new record in *out (must be NULL: else 3); header
  * is filled even when the payload is refused. 2 null argument, 3 length <= 16,
- * 1 malformed frame or unsupported meta major. */
+ * 1 malformed frame or unsupported meta major, 4 out of memory. The frame
+ * is exactly 16 + metaBytes bytes and metaBytes must be the payload size;
+ * bytes after it are ignored (the next frame). */
 int KtSimlParse(const unsigned char* data, unsigned int length, KtFrameHeader* header,
                 _KtMetaSimilarity** out);
 
-/* ---- representative meta ("REPM", meta version 2.0 written, 1.x read) ---- */
+/* ---- representative meta ("REPM", meta version 2.0 written, 1.x read) ----
+ * Members without a comment behave as their similarity counterparts; the
+ * dispose also frees the record's arrays. */
 int KtRepmGetVersion(_KtMetaVersion* meta, _KtEngineVersion* engine);
-/* Deep copy; 3 when *out is set or the meta has more than 10 fingers, 4 out of memory. */
+/* Deep copy; 3 when *out is set, the meta has more than 10 fingers or a
+ * count without its array, 4 out of memory. */
 int KtRepmCloneMeta(const _KtMetaRepresentative* src, _KtMetaRepresentative** out);
 int KtRepmDisposeMeta(_KtMetaRepresentative** m);
 int KtRepmDump(const _KtMetaRepresentative* m, FILE* stream);
-/* Stores 16 + the payload size of m; 2 null, 3 more than 10 fingers. */
+/* Stores 16 + the payload size of m; 2 null, 3 more than 10 fingers, a
+ * count without its array or a size beyond 32 bits. */
 int KtRepmGetSerializedSize(const _KtMetaRepresentative* m, unsigned int* size);
 /* metaVersion->major 2 writes the current payload; 1 fails with 1 (read-only
- * legacy format); any other value 13. */
+ * legacy format, said on stderr); any other value 13. 2 null argument, 3
+ * buffer too short or a meta GetSerializedSize refuses. */
 int KtRepmSerialize(const _KtMetaVersion* metaVersion, const _KtEngineVersion* engineVersion,
                     const _KtMetaRepresentative* m, unsigned char* buffer, unsigned int length);
-/* 2 null argument or *out set, 3 length <= 16, 1 malformed frame or payload. */
+/* 2 null argument or *out set, 3 length <= 16, 1 malformed frame or payload
+ * (also more than 10 fingers, so that every parsed meta can be written
+ * again), 4 out of memory. Major 1 frames read the legacy 16-byte payload. */
 int KtRepmParse(const unsigned char* data, unsigned int length, KtFrameHeader* header,
                 _KtMetaRepresentative** out);
 
-/* ---- colour label meta ("CLBL", meta version 1.0) ---- */
+/* ---- colour label meta ("CLBL", meta version 1.0) ----
+ * Members without a comment behave as their similarity counterparts. */
 int KtClblGetVersion(_KtMetaVersion* meta, _KtEngineVersion* engine);
-/* 3 when *out is set. */
+/* 2 null argument, 3 when *out is set, 4 out of memory. */
 int KtClblCloneMeta(const _KtMetaColorLabel* src, _KtMetaColorLabel** out);
 int KtClblDisposeMeta(_KtMetaColorLabel** m);
 int KtClblDump(const _KtMetaColorLabel* m, FILE* stream);
@@ -181,7 +192,7 @@ int KtClblDump(const _KtMetaColorLabel* m, FILE* stream);
 int KtClblGetSerializedSize(unsigned int* size);
 int KtClblSerialize(const _KtMetaVersion* metaVersion, const _KtEngineVersion* engineVersion,
                     const _KtMetaColorLabel* m, unsigned char* buffer, unsigned int length);
-/* 3 null argument, *out set or length <= 16; 1 malformed frame. */
+/* 3 null argument, *out set or length <= 16; 1 malformed frame; 4 out of memory. */
 int KtClblParse(const unsigned char* data, unsigned int length, KtFrameHeader* header,
                 _KtMetaColorLabel** out);
 

@@ -140,14 +140,32 @@ _VondResult VondOrielAnalyze(const _zbm_Image* pImage, uint32_t width, uint32_t 
                              const _VondFaceRect* pFaceRectArray, Oriel_DetectDictionaryMode dicMode,
                              float faceEngineParam, uint32_t faceRcSize, _FaceMeta& faceMeta,
                              Oriel_ClusterSubject& subject, _VondOrielMetaArray& metaArray);
-/* Bytes of the face section (8 + 8 per face + OFM container), 0 on failure. */
+/* Bytes of the face section (8 + 8 per face + a version-259 OFM container),
+ * exactly what VondOrielSerialize writes; 0 when the meta cannot be written
+ * (faceNum != regionCount, an unrepresentable region, a size beyond 32 bits). */
 uint32_t VondOrielGetSerializedSize(const _FaceMeta& faceMeta);
+/* Writes subject, the score pairs and the OFM container ("MM", big-endian)
+ * into pBuf; written = bytes written (0 on failure). Nothing changes owner.
+ * Status 2 "Buffer size is not correctly allocated." for a buffer too small
+ * for the prefix and scores (or <= 3 bytes); 1 NULL pBuf or NULL scores with
+ * a count; 3 a score count other than regionCount, or the container failed
+ * ("OFM_SerializeOfm() failed"). */
 _VondResult VondOrielSerialize(const _FaceMeta& faceMeta, Oriel_ClusterSubject subject,
                                const _VondOrielMetaArray& metaArray, uint8_t* pBuf, uint32_t bufSize,
                                uint32_t& written);
+/* Reads a face section of at most bufSize bytes (the rest of the blob may
+ * follow). The outputs must be zeroed or hold an earlier result: they are
+ * released first. On success the caller owns the regions and scores
+ * (VondOrielDisposeMeta) and consumed = the section's bytes; on failure the
+ * outputs are empty and consumed is 0. Status 1 NULL pBuf; 2 "VOND_NEW
+ * failed"; 3 malformed ("Read buffer size is too small.", "OFM_GetOfmHeader()
+ * failed", "metaArray.count != faceNum", "OFM_GetOfmSize() failed",
+ * "OFM_ParseOfmData() failed"). */
 _VondResult VondOrielParse(const uint8_t* pBuf, uint32_t bufSize, _FaceMeta& faceMeta, Oriel_ClusterSubject& subject,
                            _VondOrielMetaArray& metaArray, uint32_t& consumed);
+/* Prints the face section to standard output. */
 void VondOrielDump(const _FaceMeta& faceMeta, Oriel_ClusterSubject subject, const _VondOrielMetaArray& metaArray);
+/* Frees the regions with their lists and the score array; leaves both empty. */
 void VondOrielDisposeMeta(_FaceMeta& faceMeta, _VondOrielMetaArray& metaArray);
 
 /* ------------------------------------------------------------------ quality section */
@@ -159,19 +177,28 @@ _VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEng
 /* Bytes of the three Kt frames, 0 on failure. */
 uint32_t VondKtLibGetSerializedSize(const _KtMetaSimilarity& similarity, const _KtMetaRepresentative& representative,
                                     const _KtMetaColorLabel& colorLabel);
+/* Writes the similarity, representative and colour label frames back to back
+ * into pBuf; written = their total size (0 on failure). 1 bufSize below the
+ * total, 3 a size or a frame cannot be written. */
 _VondResult VondKtLibSerialize(const _KtEngineVersion& simlEngine, const _KtMetaVersion& simlMeta,
                                const _KtMetaSimilarity& similarity, const _KtEngineVersion& repmEngine,
                                const _KtMetaVersion& repmMeta, const _KtMetaRepresentative& representative,
                                const _KtEngineVersion& clblEngine, const _KtMetaVersion& clblMeta,
                                const _KtMetaColorLabel& colorLabel, uint8_t* pBuf, uint32_t bufSize,
                                uint32_t& written);
+/* Reads the three frames from pBuf (bufSize: bytes to the end of the buffer)
+ * into the records, which receive copies of their own; consumed = bytes of
+ * the three frames. 2 out of memory, 3 a frame is refused (the message names
+ * it); on failure the representative's arrays are released. */
 _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersion& simlEngine,
                            _KtMetaVersion& simlMeta, _KtMetaSimilarity& similarity, _KtEngineVersion& repmEngine,
                            _KtMetaVersion& repmMeta, _KtMetaRepresentative& representative,
                            _KtEngineVersion& clblEngine, _KtMetaVersion& clblMeta, _KtMetaColorLabel& colorLabel,
                            uint32_t& consumed);
+/* Prints the three metas to standard output. */
 void VondKtLibDump(const _KtMetaSimilarity& similarity, const _KtMetaRepresentative& representative,
                    const _KtMetaColorLabel& colorLabel);
+/* Frees the representative's arrays and clears their pointers and counts. */
 void VondKtlibDisposeMeta(_KtMetaSimilarity& similarity, _KtMetaRepresentative& representative,
                           _KtMetaColorLabel& colorLabel);
 

@@ -1,0 +1,158 @@
+// The quality section of the photo meta: the similarity, representative and
+// colour label frames back to back. The _VondMeta record keeps its own copies
+// of the three metas; the Kt library's heap records never outlive a call.
+#include <lumicor/vond.h>
+
+#include "common/src/internal/memory.h"
+#include "ktlib/src/frame/kt_repm_record.h"
+#include "lumicor/src/glue/vond_result.h"
+
+#include <cstdio>
+#include <cstring>
+#include <memory>
+
+namespace {
+
+// Kt records are released by their own dispose functions on every path.
+struct SimlDeleter {
+    void operator()(_KtMetaSimilarity* m) const { KtSimlDisposeMeta(&m); }
+};
+struct RepmDeleter {
+    void operator()(_KtMetaRepresentative* m) const { KtRepmDisposeMeta(&m); }
+};
+struct ClblDeleter {
+    void operator()(_KtMetaColorLabel* m) const { KtClblDisposeMeta(&m); }
+};
+
+// Copies the representative record with arrays of its own: 0, 3 for a
+// record that cannot be copied, 4 out of memory (nothing left allocated).
+int deepCopyRepm(const _KtMetaRepresentative& src, _KtMetaRepresentative& dst) {
+    return ktrepm::DeepCopy(src, &dst);
+}
+
+// A Kt call that ran out of memory is reported as such; any other failure
+// of a frame is a format error.
+uint32_t StatusOf(int ktStatus) {
+    return ktStatus == KT_ERR_NO_MEMORY ? VOND_STATUS_OUT_OF_MEMORY : VOND_STATUS_FAILED;
+}
+
+bool QualitySizes(const _KtMetaRepresentative& representative, uint32_t* simlSize, uint32_t* repmSize,
+                  uint32_t* clblSize, uint32_t* total) {
+    unsigned int siml = 0, repm = 0, clbl = 0;
+    if (KtSimlGetSerializedSize(&siml) != KT_OK || KtRepmGetSerializedSize(&representative, &repm) != KT_OK ||
+        KtClblGetSerializedSize(&clbl) != KT_OK) {
+        return false;
+    }
+    uint32_t sum;
+    if (!lmk::CheckedAdd(siml, repm, &sum) || !lmk::CheckedAdd(sum, clbl, &sum)) return false;
+    *simlSize = siml;
+    *repmSize = repm;
+    *clblSize = clbl;
+    *total = sum;
+    return true;
+}
+
+}  // namespace
+
+uint32_t VondKtLibGetSerializedSize(const _KtMetaSimilarity&, const _KtMetaRepresentative& representative,
+                                    const _KtMetaColorLabel&) {
+    uint32_t siml, repm, clbl, total;
+    return QualitySizes(representative, &siml, &repm, &clbl, &total) ? total : 0;
+}
+
+_VondResult VondKtLibSerialize(const _KtEngineVersion& simlEngine, const _KtMetaVersion& simlMeta,
+                               const _KtMetaSimilarity& similarity, const _KtEngineVersion& repmEngine,
+                               const _KtMetaVersion& repmMeta, const _KtMetaRepresentative& representative,
+                               const _KtEngineVersion& clblEngine, const _KtMetaVersion& clblMeta,
+                               const _KtMetaColorLabel& colorLabel, uint8_t* pBuf, uint32_t bufSize,
+                               uint32_t& written) {
+    _VondResult result = vond::Begin("VondKtLibSerialize");
+    written = 0;
+    uint32_t simlSize, repmSize, clblSize, total;
+    if (!QualitySizes(representative, &simlSize, &repmSize, &clblSize, &total)) {
+        return vond::Fail(result, VOND_STATUS_FAILED,
+                          "KtSimlGetSerializedSize() or KtRepmGetSerializedSize() or KtClblGetSerializedSize() failed");
+    }
+    if (total > bufSize) return vond::Fail(result, VOND_STATUS_INVALID_PARAMETER, "bufSize < simlSize + repmSize + clblSize");
+
+    if (KtSimlSerialize(&simlMeta, &simlEngine, &similarity, pBuf, bufSize) != KT_OK) {
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtSimlSerialize() failed");
+    }
+    if (KtRepmSerialize(&repmMeta, &repmEngine, &representative, pBuf + simlSize, bufSize - simlSize) != KT_OK) {
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtRempSerialize() failed");
+    }
+    const uint32_t clblOffset = simlSize + repmSize;
+    if (KtClblSerialize(&clblMeta, &clblEngine, &colorLabel, pBuf + clblOffset, bufSize - clblOffset) != KT_OK) {
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtClblSerialize() failed");
+    }
+    written = total;
+    return result;
+}
+
+_VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersion& simlEngine,
+                           _KtMetaVersion& simlMeta, _KtMetaSimilarity& similarity, _KtEngineVersion& repmEngine,
+                           _KtMetaVersion& repmMeta, _KtMetaRepresentative& representative,
+                           _KtEngineVersion& clblEngine, _KtMetaVersion& clblMeta, _KtMetaColorLabel& colorLabel,
+                           uint32_t& consumed) {
+    _VondResult result = vond::Begin("VondKtLibParse");
+    consumed = 0;
+    // Whatever was copied into the caller's records is released on failure.
+    auto release = lmk::MakeScopeGuard([&] { VondKtlibDisposeMeta(similarity, representative, colorLabel); });
+    // A parsed frame is its 16-byte header plus exactly metaBytes of payload,
+    // and each frame's parser is given the bytes up to the end of the buffer.
+    KtFrameHeader header;
+
+    std::unique_ptr<_KtMetaSimilarity, SimlDeleter> siml;
+    {
+        _KtMetaSimilarity* out = nullptr;
+        const int status = KtSimlParse(pBuf, bufSize - consumed, &header, &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtSimlParse() failed");
+        siml.reset(out);
+    }
+    similarity = *siml;
+    simlEngine = header.engineVersion;
+    simlMeta = header.metaVersion;
+    consumed += 16 + header.metaBytes;
+
+    std::unique_ptr<_KtMetaRepresentative, RepmDeleter> repm;
+    {
+        _KtMetaRepresentative* out = nullptr;
+        const int status = KtRepmParse(pBuf + consumed, bufSize - consumed, &header, &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtRepmParse() failed");
+        repm.reset(out);
+    }
+    {
+        const int status = deepCopyRepm(*repm, representative);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "deepCopyRepm() failed");
+    }
+    repmEngine = header.engineVersion;
+    repmMeta = header.metaVersion;
+    consumed += 16 + header.metaBytes;
+
+    std::unique_ptr<_KtMetaColorLabel, ClblDeleter> clbl;
+    {
+        _KtMetaColorLabel* out = nullptr;
+        const int status = KtClblParse(pBuf + consumed, bufSize - consumed, &header, &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtClblParse() failed");
+        clbl.reset(out);
+    }
+    colorLabel = *clbl;
+    clblEngine = header.engineVersion;
+    clblMeta = header.metaVersion;
+    consumed += 16 + header.metaBytes;
+
+    release.Dismiss();
+    return result;
+}
+
+void VondKtLibDump(const _KtMetaSimilarity& similarity, const _KtMetaRepresentative& representative,
+                   const _KtMetaColorLabel& colorLabel) {
+    std::printf("\n*** VondKtLibDump() ***\n");
+    KtSimlDump(&similarity, stdout);
+    KtRepmDump(&representative, stdout);
+    KtClblDump(&colorLabel, stdout);
+}
+
+void VondKtlibDisposeMeta(_KtMetaSimilarity&, _KtMetaRepresentative& representative, _KtMetaColorLabel&) {
+    ktrepm::ReleaseArrays(&representative);
+}
