@@ -1,10 +1,12 @@
 // Face engine timings on one core, on the networks' sample photos scaled to
 // a 640-pixel-wide working photo (as the photo analysis hands it over):
 //   detection as the analysis configures it (working pixel count 76800),
-//   landmarks + expression + age of one face, recognition of one face.
+//   landmarks + expression + age of one face, recognition of one face,
+//   and the whole face analysis (VondOrielAnalyze) of the photo.
 // Skipped when the sample photos are absent.
 #include <benchmark/benchmark.h>
 #include <lumicor/orielplus.h>
+#include <lumicor/vond.h>
 
 #include <cstdio>
 #include <cstring>
@@ -157,5 +159,37 @@ void BM_Recognition(benchmark::State& state) {
     }
 }
 BENCHMARK(BM_Recognition)->Unit(benchmark::kMillisecond);
+
+}  // namespace
+
+namespace {
+
+void BM_VondOrielAnalyze(benchmark::State& state) {
+    const Photo* p = Sample();
+    if (!p) {
+        state.SkipWithError("sample photos absent");
+        return;
+    }
+    _zbm_Image img;
+    img.pData = const_cast<uint8_t*>(p->rgb.data());
+    img.width = p->w;
+    img.height = p->h;
+    img.pitch = p->w * 3;
+    img.order = ZBM_PIXEL_ORDER_RGB;
+    img.bytesPerPixel = 3;
+    img.ownsData = 0;
+    uint32_t faces = 0;
+    for (auto _ : state) {
+        _FaceMeta meta;
+        std::memset(static_cast<void*>(&meta), 0, sizeof meta);
+        Oriel_ClusterSubject subject = 0;
+        _VondOrielMetaArray scores = {0, nullptr};
+        VondOrielAnalyze(&img, 1920, 1280, -1, nullptr, 7, 0.0f, 76800, meta, subject, scores);
+        faces = meta.regionCount;
+        VondOrielDisposeMeta(meta, scores);
+    }
+    state.counters["faces"] = faces;
+}
+BENCHMARK(BM_VondOrielAnalyze)->Unit(benchmark::kMillisecond);
 
 }  // namespace
