@@ -9,7 +9,7 @@ DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenc
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user \
                 nodejs
 
-.PHONY: all deps build test demo fuzz bench install clean $(addprefix test-,$(PRESETS))
+.PHONY: all deps build test demo fuzz bench parity install clean $(addprefix test-,$(PRESETS))
 
 all: build
 
@@ -51,6 +51,10 @@ fuzz: deps
 
 bench: build
 	@for b in build/default/lumicor_bench build/default/bench_*; do [ -x $$b ] && $$b; done; true
+
+# Face engine against the face networks' reference pipeline (needs npm).
+parity: build
+	tools/parity/run.sh build/default
 
 install: build
 	cmake --install build/default

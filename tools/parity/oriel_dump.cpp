@@ -6,6 +6,9 @@
 //                                   and descriptor of every face
 //   oriel_dump --engine photo.ppm   the OrielPlus interface as the photo
 //                                   analysis configures it (records only)
+//   oriel_dump --vectors photo.ppm x y w h [x y w h ...]
+//                                   identity vectors (unpacked) of the faces
+//                                   under the given boxes (fractions)
 #include <lumicor/orielplus.h>
 
 #include <cstdio>
@@ -110,9 +113,40 @@ int Reference(const std::vector<uint8_t>& rgb, int w, int h) {
     return 0;
 }
 
+int Vectors(const std::vector<uint8_t>& rgb, int w, int h, int argc, char** argv) {
+    OrielHandle e = nullptr;
+    if (OrielPlus_Initialize(&e) != 0) return 1;
+    std::printf("[");
+    for (int i = 0; i + 3 < argc; i += 4) {
+        Oriel_areaInfo f;
+        oriel::ResetAreaInfo(&f);
+        f.x = static_cast<float>(std::atof(argv[i]));
+        f.y = static_cast<float>(std::atof(argv[i + 1]));
+        f.width = static_cast<float>(std::atof(argv[i + 2]));
+        f.height = static_cast<float>(std::atof(argv[i + 3]));
+        uint32_t words[(ORIEL_VECTOR_BYTES + 3) / 4];
+        Oriel_faceVectorData v = {0, 0, 0, 0, 0, words};
+        float unit[ORIEL_VECTOR_LENGTH] = {0};
+        if (OrielPlus_MakeFaceVector(rgb.data(), w, h, ORIEL_COLOR_RGB, w * 3, &f, &v, e) == 0)
+            oriel::FaceEngine::UnpackVector(v, unit);
+        std::printf("%s[", i ? ",\n" : "");
+        for (uint32_t k = 0; k < ORIEL_VECTOR_LENGTH; ++k) std::printf("%s%.6f", k ? ", " : "", unit[k]);
+        std::printf("]");
+    }
+    std::printf("]\n");
+    OrielPlus_Finalize(&e);
+    return 0;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
+    if (argc >= 7 && std::strcmp(argv[1], "--vectors") == 0) {
+        std::vector<uint8_t> rgb;
+        int w = 0, h = 0;
+        if (!ReadPpm(argv[2], &rgb, &w, &h)) return 1;
+        return Vectors(rgb, w, h, argc - 3, argv + 3);
+    }
     const bool engine = argc == 3 && std::strcmp(argv[1], "--engine") == 0;
     if (argc != 2 && !engine) {
         std::fprintf(stderr, "usage: oriel_dump [--engine] photo.ppm\n");

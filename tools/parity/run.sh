@@ -6,8 +6,9 @@ set -e
 here=$(cd "$(dirname "$0")" && pwd)
 root=$(cd "$here/../.." && pwd)
 build=${1:-$root/build/default}
-cache=${LUMICOR_DEPS_CACHE:-${HOME:-$root/build}/.cache/lumicor}
-[ -n "$LUMICOR_DEPS_CACHE" ] || cache=${HOME:+$HOME/.cache/lumicor}
+if [ -n "$LUMICOR_DEPS_CACHE" ]; then cache=$LUMICOR_DEPS_CACHE
+elif [ -n "$HOME" ]; then cache=$HOME/.cache/lumicor
+else cache=$build/_deps; fi
 mods=$cache/parity-node
 if [ ! -d "$mods/node_modules/@tensorflow/tfjs-backend-wasm" ]; then
   mkdir -p "$mods"
@@ -15,5 +16,5 @@ if [ ! -d "$mods/node_modules/@tensorflow/tfjs-backend-wasm" ]; then
   (cd "$mods" && npm install --silent --no-audit --no-fund)
 fi
 cmake --build "$build" --target oriel_dump
-NODE_PATH=$mods/node_modules exec node "$here/run_parity.js" "$cache/face-api-1.7.15/package" \
+NODE_PATH=$mods/node_modules JPEG_JS=$cache/jpeg-js-0.4.4/package exec node "$here/run_parity.js" "$cache/face-api-1.7.15/package" \
   "$build/tools/parity/oriel_dump" "$cache"/face-samples-1.7.15/sample*.ppm

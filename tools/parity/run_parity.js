@@ -5,7 +5,12 @@
 // face size, age difference, smile difference and descriptor cosine. Also
 // counts what the engine finds as the photo analysis configures it.
 //
-//   NODE_PATH=<dir with @tensorflow/*> node run_parity.js <face-api package dir> <oriel_dump> <photo.ppm>...
+// Then the identity check: each reference face against itself mirrored,
+// rescaled by 0.5 and 2, brightened and recompressed (JPEG, quality 75),
+// and against the other people of its photo.
+//
+//   NODE_PATH=<dir with @tensorflow/*> JPEG_JS=<jpeg-js package dir> \
+//     node run_parity.js <face-api package dir> <oriel_dump> <photo.ppm>...
 // (tools/parity/run.sh installs the modules into the cache and runs this.)
 'use strict';
 const fs = require('fs');
@@ -31,6 +36,47 @@ function loadNet(net, name) {
   const bin = Buffer.concat(manifest.flatMap((g) => g.paths).map((p) => fs.readFileSync(path.join(dir, p))));
   const map = tf.io.decodeWeights(bin.buffer.slice(bin.byteOffset, bin.byteOffset + bin.length), weights);
   net.loadFromWeightMap(map);
+}
+
+function writePpm(file, img) {
+  fs.writeFileSync(file, Buffer.concat([Buffer.from(`P6\n${img.w} ${img.h}\n255\n`, 'latin1'), Buffer.from(img.data)]));
+}
+
+function transform(img, kind) {
+  const { w, h, data } = img;
+  if (kind === 'mirror') {
+    const out = Buffer.alloc(data.length);
+    for (let y = 0; y < h; y++) for (let x = 0; x < w; x++) data.copy(out, (y * w + x) * 3, (y * w + (w - 1 - x)) * 3, (y * w + (w - 1 - x)) * 3 + 3);
+    return { w, h, data: out };
+  }
+  if (kind === 'bright') return { w, h, data: Buffer.from(data.map((v) => Math.min(255, v + 40))) };
+  if (kind === 'jpeg') {
+    const jpeg = require(process.env.JPEG_JS);
+    const rgba = Buffer.alloc(w * h * 4);
+    for (let i = 0; i < w * h; i++) { data.copy(rgba, i * 4, i * 3, i * 3 + 3); rgba[i * 4 + 3] = 255; }
+    const dec = jpeg.decode(jpeg.encode({ width: w, height: h, data: rgba }, 75).data, { formatAsRGBA: false, useTArray: true });
+    return { w, h, data: Buffer.from(dec.data) };
+  }
+  const f = kind === 'half' ? 0.5 : 2;  // bilinear resampling
+  const W = Math.round(w * f); const H = Math.round(h * f);
+  const out = Buffer.alloc(W * H * 3);
+  for (let y = 0; y < H; y++) {
+    const sy = Math.min(h - 1, Math.max(0, (y + 0.5) / f - 0.5)); const y0 = Math.floor(sy); const y1 = Math.min(h - 1, y0 + 1); const dy = sy - y0;
+    for (let x = 0; x < W; x++) {
+      const sx = Math.min(w - 1, Math.max(0, (x + 0.5) / f - 0.5)); const x0 = Math.floor(sx); const x1 = Math.min(w - 1, x0 + 1); const dx = sx - x0;
+      for (let c = 0; c < 3; c++) {
+        const at = (xx, yy) => data[(yy * w + xx) * 3 + c];
+        out[(y * W + x) * 3 + c] = Math.round((at(x0, y0) * (1 - dx) + at(x1, y0) * dx) * (1 - dy) + (at(x0, y1) * (1 - dx) + at(x1, y1) * dx) * dy);
+      }
+    }
+  }
+  return { w: W, h: H, data: out };
+}
+
+function vectors(file, boxes) {
+  const args = ['--vectors', file];
+  for (const b of boxes) args.push(...b.map((v) => v.toFixed(6)));
+  return JSON.parse(execFileSync(dumpTool, args, { maxBuffer: 1 << 26 }).toString());
 }
 
 function iou(a, b) {
@@ -102,6 +148,35 @@ async function main() {
   console.log(`faces: reference ${refFaces}; worst IoU ${f(worst('iou', true), 3)}, landmark error ${f(worst('landmarkError', false) * 100, 2)}%, `
     + `age diff ${f(worst('ageDiff', false), 2)}, smile diff ${f(worst('smileDiff', false), 2)}, cosine ${f(worst('cosine', true), 4)}`);
   console.log(`engine as configured by the analysis: ${engineFound} of ${refFaces} reference faces found, ${engineFalse} other detections`);
+
+  // Identity: same face under transformations versus different people.
+  const tmp = fs.mkdtempSync(path.join(require('os').tmpdir(), 'parity-'));
+  let worstSame = 1; let worstSameWhat = ''; let bestWithin = 0; let bestAcross = 0;
+  const all = [];
+  for (const photo of photos) {
+    const img = readPpm(photo);
+    const boxes = rows.filter((r) => r.photo === path.basename(photo)).map((r) => {
+      const [x, y, w, h] = r.box.split(',').map(Number);
+      return [x / img.w, y / img.h, w / img.w, h / img.h];
+    });
+    const base = vectors(photo, boxes);
+    base.forEach((v, i) => all.push({ photo, i, v }));
+    for (let a = 0; a < base.length; a++) for (let b = a + 1; b < base.length; b++) bestWithin = Math.max(bestWithin, cosine(base[a], base[b]));
+    for (const kind of ['mirror', 'half', 'double', 'bright', 'jpeg']) {
+      const t = transform(img, kind);
+      const file = path.join(tmp, `${kind}.ppm`);
+      writePpm(file, t);
+      const tb = kind === 'mirror' ? boxes.map(([x, y, w, h]) => [1 - x - w, y, w, h]) : boxes;
+      vectors(file, tb).forEach((v, i) => {
+        const c = cosine(base[i], v);
+        if (c < worstSame) { worstSame = c; worstSameWhat = `${path.basename(photo)} face ${i} ${kind}`; }
+      });
+    }
+  }
+  for (let a = 0; a < all.length; a++) for (let b = a + 1; b < all.length; b++) if (all[a].photo !== all[b].photo) bestAcross = Math.max(bestAcross, cosine(all[a].v, all[b].v));
+  fs.rmSync(tmp, { recursive: true, force: true });
+  console.log(`identity: worst same-face similarity ${worstSame.toFixed(4)} (${worstSameWhat}); best different-person similarity `
+    + `within one photo ${bestWithin.toFixed(4)}; best across photos (people not checked) ${bestAcross.toFixed(4)}`);
 }
 
 main().catch((e) => { console.error(e); process.exit(1); });

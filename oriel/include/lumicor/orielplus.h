@@ -103,14 +103,16 @@ typedef enum Oriel_InputColorMode {
  *   pitch      asin(clamp(2 (0.55 - r), -1, 1)), r = distance of the nose
  *              tip below the eye line divided by the mouth centre's:
  *              about 0 for a level face, positive for a face looking up.
- *              All three are rough geometric estimates (about +-10 degrees).
+ *              All three are geometric estimates from 2-D landmarks, not
+ *              calibrated head-pose angles.
  *   rightEyeX/Y, leftEyeX/Y  centres of the person's right eye (landmarks
  *              36..41, on the image left for an upright frontal face) and
  *              left eye (42..47).
  *   part1X/Y   nose tip (landmark 30); part2X/Y mouth centre (mean of
  *              landmarks 48..67); both negative when not located.
- *   partLevels 0 nothing located, 1 eyes only (from a candidate record),
- *              2 eyes and both part points (68-point landmarks).
+ *   partLevels 0 nothing located; 2 eyes and both part points, located
+ *              from the 68 landmarks. Records given to the engine may also
+ *              say 1 (eyes only).
  *   attribute1 smile score 0..100: 100 x the probability of "happy" among
  *              the seven expressions of the expression network; -1 absent.
  *   attribute2 always -1 (absent).
@@ -119,7 +121,8 @@ typedef enum Oriel_InputColorMode {
  *              0..99; 255/255 when not estimated.
  *   male       engine field: probability 0..100 that the face is male, 255
  *              when not estimated.
- *   tag        rank of the face in its detection call (0 = best score). */
+ *   tag        position of the face in its detection call's output (0 =
+ *              first). */
 typedef struct Oriel_areaInfo {
     float x;
     float y;
@@ -209,8 +212,9 @@ typedef struct Oriel_faceVectorArray {
  *   workPixels      pixel count the detectors work at: the photo is scaled
  *                   (never enlarged past 2x) so that width x height is about
  *                   this (default 76800, at least 400). The SSD input keeps
- *                   the photo's aspect; the tiny detector uses the square
- *                   side (a multiple of 32) nearest to the longer side.
+ *                   the photo's aspect, sides rounded to multiples of 32; the
+ *                   tiny detector runs on the square side (a multiple of 32)
+ *                   nearest to the scaled longer side and on 1.5 times it.
  *   scoreThreshold  detection score threshold; values outside (0, 1) keep
  *                   the default 0.5.
  *   minFacePercent  faces whose box is smaller than this percent of the
@@ -313,12 +317,12 @@ uint32_t OrielPlus_DetectFace(const uint8_t* pPixels, uint32_t width, uint32_t h
 uint32_t OrielPlus_DetectFaceSpatial(const uint8_t* pPixels, uint32_t width, uint32_t height,
                                      Oriel_InputColorMode mode, int32_t stride, Oriel_areaArray areas,
                                      Oriel_faceAreaArray* pOut, OrielHandle handle);
-/* Confirms candidate boxes: each is searched in a window twice its size
- * centred on it, at localScales scales (window side ~ 1x and 1/1.5x of that
- * of the detector's 256-pixel input); a candidate is confirmed by the best
- * detection overlapping it (IoU >= 0.3). *pOut holds the confirmed faces
- * (the detector's boxes), in candidate order, each at most once. 3 also
- * when pCandidates is NULL or empty. */
+/* Confirms candidate boxes: scale k (0 .. localScales - 1) searches a
+ * square window centred on the candidate, of side 2 x its longer side /
+ * 1.5^k (at least 1.2 x it), with the detector at 192 x 192; a candidate is
+ * confirmed by the best-scoring detection overlapping it (IoU >= 0.3).
+ * *pOut holds the confirmed faces (the detector's boxes), in candidate
+ * order, each at most once. 3 also when pCandidates is NULL or empty. */
 uint32_t OrielPlus_DetectFaceLocal(const uint8_t* pPixels, uint32_t width, uint32_t height, Oriel_InputColorMode mode,
                                    int32_t stride, const Oriel_faceAreaArray* pCandidates, Oriel_faceAreaArray* pOut,
                                    OrielHandle handle);

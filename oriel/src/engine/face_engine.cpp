@@ -17,7 +17,6 @@ const size_t kMaxDetections = 256;
 const int kLocalInput = 192;      // detector input side of the local search
 const int kVerifyInput = 128;     // detector input side of the second look
 const size_t kMaxVerify = 4;      // second looks per detection call
-const float kPi = 3.14159265358979f;
 
 float Clamp(float v, float lo, float hi) { return v < lo ? lo : (v > hi ? hi : v); }
 

@@ -51,11 +51,6 @@ void PadInto(float* dst, const Tensor& in, int top, int left, int hp, int wp) {
 // channels in the same order whatever the vector width. So every build and
 // every kernel variant computes the same values.
 #define ORIEL_INLINE inline __attribute__((always_inline))
-#if defined(__GNUC__) && !defined(__clang__)
-// The 8-float helpers are only ever inlined into the AVX2 variants; no
-// out-of-line copy with an AVX argument exists.
-#pragma GCC diagnostic ignored "-Wpsabi"
-#endif
 
 template <int W>
 struct Vec {
@@ -69,10 +64,7 @@ template <>
 ORIEL_INLINE Vec<4>::T Vec<4>::Splat(float a) {
     return T{a, a, a, a};
 }
-template <>
-ORIEL_INLINE Vec<8>::T Vec<8>::Splat(float a) {
-    return T{a, a, a, a, a, a, a, a};
-}
+
 
 // P output pixels, one block of 8 output channels (8 / W vectors). x[p]
 // points at the first tap of pixel p; taps step by `rowStep` floats per
@@ -177,26 +169,19 @@ struct DepthwiseJob {
     Act act;
 };
 
-template <int W>
+// One output pixel of a depthwise layer: the channels [0, cv) in vectors,
+// the rest one by one, then bias and activation.
+template <class K>
 ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
-    typedef Vec<W> V;
     const DepthwiseWeights& w = *j.w;
     const int c = j.c;
-    const int cv = c - c % W;
+    const int cv = c - c % K::kWidth;
     for (int oy = 0; oy < j.ho; ++oy) {
         for (int ox = 0; ox < j.wo; ++ox) {
             float* o = j.out + (static_cast<size_t>(oy) * j.wo + ox) * c;
             const float* base = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * c;
-            int ch = 0;
-            for (; ch < cv; ch += W) {
-                typename V::T acc = V::Splat(0.0f);
-                for (int ky = 0; ky < w.kh; ++ky)
-                    for (int kx = 0; kx < w.kw; ++kx)
-                        acc += V::Load(base + ky * j.rowStep + static_cast<size_t>(kx) * c + ch) *
-                               V::Load(w.w + (static_cast<size_t>(ky) * w.kw + kx) * c + ch);
-                V::Store(o + ch, acc);
-            }
-            for (; ch < c; ++ch) {
+            for (int ch = 0; ch < cv; ch += K::kWidth) K::Run(base + ch, j.rowStep, c, w.w + ch, w.kh, w.kw, o + ch);
+            for (int ch = cv; ch < c; ++ch) {
                 float acc = 0.0f;
                 for (int ky = 0; ky < w.kh; ++ky)
                     for (int kx = 0; kx < w.kw; ++kx)
@@ -204,13 +189,25 @@ ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
                                w.w[(static_cast<size_t>(ky) * w.kw + kx) * c + ch];
                 o[ch] = acc;
             }
-            for (ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], j.act);
+            for (int ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], j.act);
         }
     }
 }
 
+struct PortableDepthwise {
+    static const int kWidth = 4;
+    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw, float* out) {
+        typedef Vec<4> V;
+        V::T acc = V::Splat(0.0f);
+        for (int ky = 0; ky < kh; ++ky)
+            for (int kx = 0; kx < kw; ++kx)
+                acc += V::Load(x + ky * rowStep + static_cast<size_t>(kx) * c) * V::Load(w + (static_cast<size_t>(ky) * kw + kx) * c);
+        V::Store(out, acc);
+    }
+};
+
 void ConvPortable(const ConvJob& j) { ConvLoops<PortableKernel, 4>(j); }
-void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<4>(j); }
+void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<PortableDepthwise>(j); }
 
 #if defined(__x86_64__) || defined(__i386__)
 // Eight-float AVX2 variants, chosen at run time; same values as above.
@@ -240,7 +237,19 @@ struct Avx2Kernel {
     }
 };
 __attribute__((target("avx2"), flatten)) void ConvAvx2(const ConvJob& j) { ConvLoops<Avx2Kernel, 8>(j); }
-__attribute__((target("avx2"))) void DepthwiseAvx2(const DepthwiseJob& j) { DepthwiseLoops<8>(j); }
+struct Avx2Depthwise {
+    static const int kWidth = 8;
+    static __attribute__((target("avx2"))) inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh,
+                                                           int kw, float* out) {
+        __m256 acc = _mm256_setzero_ps();
+        for (int ky = 0; ky < kh; ++ky)
+            for (int kx = 0; kx < kw; ++kx)
+                acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
+                                                       _mm256_loadu_ps(w + (static_cast<size_t>(ky) * kw + kx) * c)));
+        _mm256_storeu_ps(out, acc);
+    }
+};
+__attribute__((target("avx2"), flatten)) void DepthwiseAvx2(const DepthwiseJob& j) { DepthwiseLoops<Avx2Depthwise>(j); }
 bool UseAvx2(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
 #else
 void ConvAvx2(const ConvJob& j) { ConvPortable(j); }
