@@ -148,8 +148,11 @@ bool SsdDetector::Detect(const nn::ImageView& img, const nn::Crop& crop, int inW
     }
     const size_t kept = nn::NonMaxSuppression(cand.get(), nCand, 0.5f, maxOut);
     // Boxes are relative to the canvas; clip there, then express them
-    // relative to the crop.
-    const float fx = static_cast<float>(cv.w) / crop.w, fy = static_cast<float>(cv.h) / crop.h;
+    // relative to the crop, which covers the canvas' first round(crop x
+    // scale) input pixels (the convention the detector's boxes were made
+    // with).
+    const float fx = static_cast<float>(inW) / static_cast<float>(std::lround(static_cast<double>(crop.w) * inW / cv.w));
+    const float fy = static_cast<float>(inH) / static_cast<float>(std::lround(static_cast<double>(crop.h) * inH / cv.h));
     for (size_t i = 0; i < kept; ++i) {
         const nn::Box& b = cand[i].box;
         const float top = std::fmax(0.0f, b.ymin) * fy, bottom = std::fmin(1.0f, b.ymax) * fy;
@@ -201,7 +204,8 @@ bool TinyDetector::Detect(const nn::ImageView& img, const nn::Crop& crop, int in
     // Cells: 5 anchors x (x, y, w, h, score). The photo occupies the
     // top-left of the square canvas; boxes are made relative to the crop.
     const int cells = t.h;
-    const float corrX = static_cast<float>(cv.w) / crop.w, corrY = static_cast<float>(cv.h) / crop.h;
+    const float corrX = static_cast<float>(inputSize) / static_cast<float>(std::lround(static_cast<double>(crop.w) * inputSize / cv.w));
+    const float corrY = static_cast<float>(inputSize) / static_cast<float>(std::lround(static_cast<double>(crop.h) * inputSize / cv.h));
     const size_t maxCand = static_cast<size_t>(t.h) * t.w * 5;
     lmk::UniqueArray<nn::Candidate> cand = lmk::NewArray<nn::Candidate>(maxCand);
     if (!cand) return false;
