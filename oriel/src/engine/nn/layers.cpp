@@ -161,33 +161,53 @@ ORIEL_INLINE void ConvLoops(const ConvJob& j) {
 }
 
 struct DepthwiseJob {
-    const float* src;
+    const float* src;  // the unpadded input
     size_t rowStep;
     int c, ho, wo, stride;
+    int inH, inW, top, left;  // input size and leading padding
     const DepthwiseWeights* w;
     float* out;
     Act act;
 };
 
-// One output pixel of a depthwise layer: the channels [0, cv) in vectors,
-// the rest one by one, then bias and activation.
+// Depthwise layer: inner pixels, whose taps all lie inside the input, in
+// vectors (channels [0, cv)) and the rest of the channels one by one;
+// border pixels add only their taps inside the input, which gives exactly
+// what adding the zero padding would. Then bias and activation.
 template <class K>
 ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
     const DepthwiseWeights& w = *j.w;
     const int c = j.c;
     const int cv = c - c % K::kWidth;
     for (int oy = 0; oy < j.ho; ++oy) {
+        const int iy0 = oy * j.stride - j.top;
         for (int ox = 0; ox < j.wo; ++ox) {
+            const int ix0 = ox * j.stride - j.left;
             float* o = j.out + (static_cast<size_t>(oy) * j.wo + ox) * c;
-            const float* base = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * c;
-            for (int ch = 0; ch < cv; ch += K::kWidth) K::Run(base + ch, j.rowStep, c, w.w + ch, w.kh, w.kw, o + ch);
-            for (int ch = cv; ch < c; ++ch) {
-                float acc = 0.0f;
-                for (int ky = 0; ky < w.kh; ++ky)
-                    for (int kx = 0; kx < w.kw; ++kx)
-                        acc += base[ky * j.rowStep + static_cast<size_t>(kx) * c + ch] *
-                               w.w[(static_cast<size_t>(ky) * w.kw + kx) * c + ch];
-                o[ch] = acc;
+            if (iy0 >= 0 && ix0 >= 0 && iy0 + w.kh <= j.inH && ix0 + w.kw <= j.inW) {
+                const float* base = j.src + static_cast<size_t>(iy0) * j.rowStep + static_cast<size_t>(ix0) * c;
+                for (int ch = 0; ch < cv; ch += K::kWidth) K::Run(base + ch, j.rowStep, c, w.w + ch, w.kh, w.kw, o + ch);
+                for (int ch = cv; ch < c; ++ch) {
+                    float acc = 0.0f;
+                    for (int ky = 0; ky < w.kh; ++ky)
+                        for (int kx = 0; kx < w.kw; ++kx)
+                            acc += base[ky * j.rowStep + static_cast<size_t>(kx) * c + ch] *
+                                   w.w[(static_cast<size_t>(ky) * w.kw + kx) * c + ch];
+                    o[ch] = acc;
+                }
+            } else {
+                for (int ch = 0; ch < c; ++ch) o[ch] = 0.0f;
+                for (int ky = 0; ky < w.kh; ++ky) {
+                    const int iy = iy0 + ky;
+                    if (iy < 0 || iy >= j.inH) continue;
+                    for (int kx = 0; kx < w.kw; ++kx) {
+                        const int ix = ix0 + kx;
+                        if (ix < 0 || ix >= j.inW) continue;
+                        const float* x = j.src + static_cast<size_t>(iy) * j.rowStep + static_cast<size_t>(ix) * c;
+                        const float* wt = w.w + (static_cast<size_t>(ky) * w.kw + kx) * c;
+                        for (int ch = 0; ch < c; ++ch) o[ch] += x[ch] * wt[ch];
+                    }
+                }
             }
             for (int ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], j.act);
         }
@@ -317,29 +337,19 @@ Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w
     int ho, wo, top, left;
     PadFor(in.h, w.kh, stride, pad, &ho, &top);
     PadFor(in.w, w.kw, stride, pad, &wo, &left);
-    const int hp = (ho - 1) * stride + w.kh;
-    const int wp = (wo - 1) * stride + w.kw;
-    const bool padded = top != 0 || left != 0 || hp > in.h || wp > in.w;
-    const int hAlloc = hp > in.h + top ? hp : in.h + top;
-    const int wAlloc = wp > in.w + left ? wp : in.w + left;
-    float* pbuf = padded ? a.TakeRaw(Arena::kPadSlot, static_cast<size_t>(hAlloc) * wAlloc * in.c) : nullptr;
     Tensor out = a.Take(slot, ho, wo, in.c);
     if (a.Planning() || ho <= 0 || wo <= 0) return out;
-
-    const float* src = in.d;
-    int srcW = in.w;
-    if (padded) {
-        PadInto(pbuf, in, top, left, hAlloc, wAlloc);
-        src = pbuf;
-        srcW = wAlloc;
-    }
     DepthwiseJob job;
-    job.src = src;
-    job.rowStep = static_cast<size_t>(srcW) * in.c;
+    job.src = in.d;
+    job.rowStep = static_cast<size_t>(in.w) * in.c;
     job.c = in.c;
     job.ho = ho;
     job.wo = wo;
     job.stride = stride;
+    job.inH = in.h;
+    job.inW = in.w;
+    job.top = top;
+    job.left = left;
     job.w = &w;
     job.out = out.d;
     job.act = act;
