@@ -13,17 +13,32 @@ namespace {
 
 const int kBlock = 8;  // output channels per weight block (see weights.h)
 
-inline float Activate(float v, Act act) {
+// o[i] = activation(o[i] + bias[i]) for n values, one loop per activation
+// so that each one vectorises.
+inline void BiasActivate(float* o, const float* bias, int n, Act act) {
     switch (act) {
         case Act::Relu:
-            return v > 0.0f ? v : 0.0f;
+            for (int i = 0; i < n; ++i) {
+                const float v = o[i] + bias[i];
+                o[i] = v > 0.0f ? v : 0.0f;
+            }
+            break;
         case Act::Relu6:
-            return v > 0.0f ? (v < 6.0f ? v : 6.0f) : 0.0f;
+            for (int i = 0; i < n; ++i) {
+                const float v = o[i] + bias[i];
+                o[i] = v > 0.0f ? (v < 6.0f ? v : 6.0f) : 0.0f;
+            }
+            break;
         case Act::Leaky:
-            return v > 0.0f ? v : v * 0.1f;
+            for (int i = 0; i < n; ++i) {
+                const float v = o[i] + bias[i];
+                o[i] = v > 0.0f ? v : v * 0.1f;
+            }
+            break;
         case Act::None:
         default:
-            return v;
+            for (int i = 0; i < n; ++i) o[i] += bias[i];
+            break;
     }
 }
 
@@ -107,8 +122,12 @@ struct PortableKernel {
 
 template <int P>
 ORIEL_INLINE void StoreBlock(float* const* out, const float (&acc)[P][kBlock], const float* bias, int n, Act act) {
-    for (int p = 0; p < P; ++p)
-        for (int j = 0; j < n; ++j) out[p][j] = Activate(acc[p][j] + bias[j], act);
+    for (int p = 0; p < P; ++p) {
+        float v[kBlock];
+        for (int j = 0; j < kBlock; ++j) v[j] = acc[p][j];
+        BiasActivate(v, bias, kBlock, act);
+        for (int j = 0; j < n; ++j) out[p][j] = v[j];
+    }
 }
 
 struct ConvJob {
@@ -209,7 +228,7 @@ ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
                     }
                 }
             }
-            for (int ch = 0; ch < c; ++ch) o[ch] = Activate(o[ch] + w.b[ch], j.act);
+            BiasActivate(o, w.b, c, j.act);
         }
     }
 }
