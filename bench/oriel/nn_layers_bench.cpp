@@ -17,6 +17,7 @@ using oriel::nn::Tensor;
 
 void BM_Conv(benchmark::State& state) {
     const int size = static_cast<int>(state.range(0)), cin = static_cast<int>(state.range(1));
+    const int stride = state.range(5) ? static_cast<int>(state.range(5)) : 1;
     const int cout = static_cast<int>(state.range(2)), k = static_cast<int>(state.range(3));
     const KernelChoice kc = state.range(4) ? KernelChoice::Best : KernelChoice::Portable;
     std::vector<float> wts(static_cast<size_t>(k) * k * cin * ((cout + 7) / 8 * 8) + (cout + 7) / 8 * 8, 0.01f);
@@ -28,16 +29,23 @@ void BM_Conv(benchmark::State& state) {
     w.cout = cout;
     Arena a;
     Tensor in = a.Take(1, size, size, cin);
-    oriel::nn::Conv2D(a, 2, in, w, 1, Pad::Same, Act::Relu, kc);
+    oriel::nn::Conv2D(a, 2, in, w, stride, Pad::Same, Act::Relu, kc);
     a.Allocate();
     in = a.Take(1, size, size, cin);
     for (size_t i = 0; i < in.Size(); ++i) in.d[i] = 0.5f;
-    for (auto _ : state) benchmark::DoNotOptimize(oriel::nn::Conv2D(a, 2, in, w, 1, Pad::Same, Act::Relu, kc).d);
-    state.counters["GMAC/s"] = benchmark::Counter(static_cast<double>(size) * size * cin * cout * k * k * 1e-9,
+    for (auto _ : state) benchmark::DoNotOptimize(oriel::nn::Conv2D(a, 2, in, w, stride, Pad::Same, Act::Relu, kc).d);
+    state.counters["GMAC/s"] = benchmark::Counter(static_cast<double>(size) * size * cin * cout * k * k * 1e-9 / (stride * stride),
                                                   benchmark::Counter::kIsIterationInvariantRate);
 }
-// size, cin, cout, kernel, best
-BENCHMARK(BM_Conv)->Args({22, 512, 512, 1, 0})->Args({22, 512, 512, 1, 1})->Args({35, 32, 32, 3, 0})->Args({35, 32, 32, 3, 1});
+// size, cin, cout, kernel, best, stride: a late and an early SSD pointwise
+// layer, a recognition 3x3 layer and the SSD's first layer.
+BENCHMARK(BM_Conv)
+    ->Args({22, 512, 512, 1, 0, 1})
+    ->Args({22, 512, 512, 1, 1, 1})
+    ->Args({140, 32, 64, 1, 1, 1})
+    ->Args({35, 32, 32, 3, 0, 1})
+    ->Args({35, 32, 32, 3, 1, 1})
+    ->Args({280, 3, 32, 3, 1, 2});
 
 void BM_Depthwise(benchmark::State& state) {
     const int size = 88, c = 128;

@@ -4,6 +4,8 @@
 
 #if defined(__x86_64__) || defined(__i386__)
 #include <immintrin.h>
+#elif defined(__ARM_NEON)
+#include <arm_neon.h>
 #endif
 
 namespace oriel {
@@ -140,41 +142,54 @@ struct ConvJob {
     Act act;
 };
 
+// Q (P or 1) output pixels of row oy starting at column ox, output
+// channels [8 cb, 8 cb + 8).
+template <class K, int Q>
+ORIEL_INLINE void ConvPixels(const ConvJob& j, int cb, int oy, int ox) {
+    const ConvWeights& w = *j.w;
+    const int cols = j.flat ? j.ho * j.wo : j.wo;
+    const int step = j.flat ? 1 : j.stride;
+    const float* row = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep;
+    float* orow = j.out + static_cast<size_t>(oy) * cols * w.cout + cb * kBlock;
+    const float* wb = w.w + static_cast<size_t>(cb) * w.kh * w.kw * w.cin * kBlock;
+    const float* x[Q];
+    float* o[Q];
+    for (int k = 0; k < Q; ++k) {
+        x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
+        o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
+    }
+    float acc[Q][kBlock];
+    K::template Run<Q>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
+    const int n = (w.cout - cb * kBlock) < kBlock ? (w.cout - cb * kBlock) : kBlock;
+    StoreBlock<Q>(o, acc, w.b + cb * kBlock, n, j.act);
+}
+
+// Every output value is computed on its own, so the loop order only
+// matters for the caches: with small weights each block of input pixels
+// is read once for all output channels; with large weights each block of
+// weights is read once for all pixels.
 template <class K, int P>
 ORIEL_INLINE void ConvLoops(const ConvJob& j) {
     const ConvWeights& w = *j.w;
     const int blocks = (w.cout + kBlock - 1) / kBlock;
-    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
-    for (int cb = 0; cb < blocks; ++cb) {
-        const float* wb = w.w + cb * blockFloats;
-        const float* bias = w.b + cb * kBlock;
-        const int n = (w.cout - cb * kBlock) < kBlock ? (w.cout - cb * kBlock) : kBlock;
-        // Rows of output pixels; a flat job is one row of ho * wo pixels.
-        const int rows = j.flat ? 1 : j.ho;
-        const int cols = j.flat ? j.ho * j.wo : j.wo;
-        const int step = j.flat ? 1 : j.stride;
+    const int rows = j.flat ? 1 : j.ho;  // a flat job is one row of ho * wo pixels
+    const int cols = j.flat ? j.ho * j.wo : j.wo;
+    const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
+    if (weightBytes <= 64 * 1024) {
         for (int oy = 0; oy < rows; ++oy) {
-            const float* row = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep;
-            float* orow = j.out + static_cast<size_t>(oy) * cols * w.cout + cb * kBlock;
             int ox = 0;
-            for (; ox + P <= cols; ox += P) {
-                const float* x[P];
-                float* o[P];
-                for (int k = 0; k < P; ++k) {
-                    x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
-                    o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
-                }
-                float acc[P][kBlock];
-                K::template Run<P>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
-                StoreBlock<P>(o, acc, bias, n, j.act);
-            }
-            for (; ox < cols; ++ox) {
-                const float* x[1] = {row + static_cast<size_t>(ox) * step * j.cin};
-                float* o[1] = {orow + static_cast<size_t>(ox) * w.cout};
-                float acc[1][kBlock];
-                K::template Run<1>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
-                StoreBlock<1>(o, acc, bias, n, j.act);
-            }
+            for (; ox + P <= cols; ox += P)
+                for (int cb = 0; cb < blocks; ++cb) ConvPixels<K, P>(j, cb, oy, ox);
+            for (; ox < cols; ++ox)
+                for (int cb = 0; cb < blocks; ++cb) ConvPixels<K, 1>(j, cb, oy, ox);
+        }
+        return;
+    }
+    for (int cb = 0; cb < blocks; ++cb) {
+        for (int oy = 0; oy < rows; ++oy) {
+            int ox = 0;
+            for (; ox + P <= cols; ox += P) ConvPixels<K, P>(j, cb, oy, ox);
+            for (; ox < cols; ++ox) ConvPixels<K, 1>(j, cb, oy, ox);
         }
     }
 }
@@ -275,7 +290,7 @@ struct Avx2Kernel {
         for (int p = 0; p < P; ++p) _mm256_storeu_ps(out[p], acc[p]);
     }
 };
-__attribute__((target("avx2"), flatten)) void ConvAvx2(const ConvJob& j) { ConvLoops<Avx2Kernel, 8>(j); }
+__attribute__((target("avx2"), flatten)) void ConvWide(const ConvJob& j) { ConvLoops<Avx2Kernel, 8>(j); }
 struct Avx2Depthwise {
     static const int kWidth = 8;
     static __attribute__((target("avx2"))) inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh,
@@ -288,12 +303,60 @@ struct Avx2Depthwise {
         _mm256_storeu_ps(out, acc);
     }
 };
-__attribute__((target("avx2"), flatten)) void DepthwiseAvx2(const DepthwiseJob& j) { DepthwiseLoops<Avx2Depthwise>(j); }
-bool UseAvx2(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
+__attribute__((target("avx2"), flatten)) void DepthwiseWide(const DepthwiseJob& j) { DepthwiseLoops<Avx2Depthwise>(j); }
+bool UseWide(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
+#elif defined(__ARM_NEON)
+// 32-bit ARM: the compiler keeps generic float vectors on the (IEEE) VFP
+// unit, one lane at a time, because NEON flushes subnormal numbers to zero.
+// These NEON variants do the same multiplies and adds in the same order,
+// four lanes at once; they differ from the other kernels only where a
+// value below 1.2e-38 occurs, which NEON treats as 0.
+struct NeonKernel {
+    template <int P>
+    static ORIEL_INLINE void Run(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
+                                 float (&out)[P][kBlock]) {
+        float32x4_t acc[P][2];
+        for (int p = 0; p < P; ++p) acc[p][0] = acc[p][1] = vdupq_n_f32(0.0f);
+        for (int ky = 0; ky < kh; ++ky) {
+            for (int kx = 0; kx < kw; ++kx) {
+                const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
+                const float* wv = w + (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
+                const float* xp[P];
+                for (int p = 0; p < P; ++p) xp[p] = x[p] + tap;
+                for (int ci = 0; ci < cin; ++ci, wv += kBlock) {
+                    const float32x4_t w0 = vld1q_f32(wv), w1 = vld1q_f32(wv + 4);
+                    for (int p = 0; p < P; ++p) {
+                        const float32x4_t a = vdupq_n_f32(xp[p][ci]);
+                        acc[p][0] = vaddq_f32(acc[p][0], vmulq_f32(a, w0));
+                        acc[p][1] = vaddq_f32(acc[p][1], vmulq_f32(a, w1));
+                    }
+                }
+            }
+        }
+        for (int p = 0; p < P; ++p) {
+            vst1q_f32(out[p], acc[p][0]);
+            vst1q_f32(out[p] + 4, acc[p][1]);
+        }
+    }
+};
+struct NeonDepthwise {
+    static const int kWidth = 4;
+    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw, float* out) {
+        float32x4_t acc = vdupq_n_f32(0.0f);
+        for (int ky = 0; ky < kh; ++ky)
+            for (int kx = 0; kx < kw; ++kx)
+                acc = vaddq_f32(acc, vmulq_f32(vld1q_f32(x + ky * rowStep + static_cast<size_t>(kx) * c),
+                                               vld1q_f32(w + (static_cast<size_t>(ky) * kw + kx) * c)));
+        vst1q_f32(out, acc);
+    }
+};
+void ConvWide(const ConvJob& j) { ConvLoops<NeonKernel, 4>(j); }
+void DepthwiseWide(const DepthwiseJob& j) { DepthwiseLoops<NeonDepthwise>(j); }
+bool UseWide(KernelChoice k) { return k != KernelChoice::Portable; }
 #else
-void ConvAvx2(const ConvJob& j) { ConvPortable(j); }
-void DepthwiseAvx2(const DepthwiseJob& j) { DepthwisePortable(j); }
-bool UseAvx2(KernelChoice) { return false; }
+void ConvWide(const ConvJob& j) { ConvPortable(j); }
+void DepthwiseWide(const DepthwiseJob& j) { DepthwisePortable(j); }
+bool UseWide(KernelChoice) { return false; }
 #endif
 
 }  // namespace
@@ -344,8 +407,8 @@ Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int st
     job.w = &w;
     job.out = out.d;
     job.act = act;
-    if (UseAvx2(kernels))
-        ConvAvx2(job);
+    if (UseWide(kernels))
+        ConvWide(job);
     else
         ConvPortable(job);
     return out;
@@ -372,8 +435,8 @@ Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w
     job.w = &w;
     job.out = out.d;
     job.act = act;
-    if (UseAvx2(kernels))
-        DepthwiseAvx2(job);
+    if (UseWide(kernels))
+        DepthwiseWide(job);
     else
         DepthwisePortable(job);
     return out;

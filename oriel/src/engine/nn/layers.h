@@ -2,8 +2,9 @@
 //
 // Every kernel accumulates each output value in one fixed order (taps, then
 // input channels, each from first to last; bias added last), whatever the
-// vector width the compiler picks, so x86-64 and 32-bit ARM give the same
-// results (the library is built without fused multiply-add). Kernels never
+// vector width, so x86-64 and 32-bit ARM give the same results (the library
+// is built without fused multiply-add) up to NEON's flushing of subnormal
+// values. Kernels never
 // allocate: they write into arena slots planned beforehand.
 #ifndef ORIEL_ENGINE_NN_LAYERS_H
 #define ORIEL_ENGINE_NN_LAYERS_H
@@ -23,8 +24,9 @@ enum class Pad { Same, Valid };
 void PadFor(int in, int k, int stride, Pad pad, int* out, int* before);
 
 // Kernel variants: Best picks the widest vectors the processor has (AVX2
-// on x86-64 when present); Portable forces the 4-float kernels. Both give
-// identical results.
+// on x86-64 when present, NEON on ARM); Portable forces the generic
+// 4-float kernels. They give identical results, except that NEON treats
+// subnormal values (below 1.2e-38) as 0.
 enum class KernelChoice { Best, Portable };
 
 Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act,
