@@ -132,6 +132,18 @@ ORIEL_INLINE void StoreBlock(float* const* out, const float (&acc)[P][kBlock], c
     }
 }
 
+// Accumulation by kernel K, then bias and activation into the outputs.
+template <class K>
+struct Stored : K {
+    template <int P>
+    static ORIEL_INLINE void RunStore(const float* const* x, size_t rowStep, int kh, int kw, int cin, const float* w,
+                                      const float* bias, int n, Act act, float* const* out) {
+        float acc[P][kBlock];
+        K::template Run<P>(x, rowStep, kh, kw, cin, w, acc);
+        StoreBlock<P>(out, acc, bias, n, act);
+    }
+};
+
 struct ConvJob {
     const float* src;  // input (padded when needed)
     size_t rowStep;    // floats per input row
@@ -158,10 +170,8 @@ ORIEL_INLINE void ConvPixels(const ConvJob& j, int cb, int oy, int ox) {
         x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
         o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
     }
-    float acc[Q][kBlock];
-    K::template Run<Q>(x, j.rowStep, w.kh, w.kw, j.cin, wb, acc);
     const int n = (w.cout - cb * kBlock) < kBlock ? (w.cout - cb * kBlock) : kBlock;
-    StoreBlock<Q>(o, acc, w.b + cb * kBlock, n, j.act);
+    K::template RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, wb, w.b + cb * kBlock, n, j.act, o);
 }
 
 // Every output value is computed on its own, so the loop order only
@@ -260,7 +270,7 @@ struct PortableDepthwise {
     }
 };
 
-void ConvPortable(const ConvJob& j) { ConvLoops<PortableKernel, 4>(j); }
+void ConvPortable(const ConvJob& j) { ConvLoops<Stored<PortableKernel>, 4>(j); }
 void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<PortableDepthwise>(j); }
 
 #if defined(__x86_64__) || defined(__i386__)
@@ -288,6 +298,36 @@ struct Avx2Kernel {
             }
         }
         for (int p = 0; p < P; ++p) _mm256_storeu_ps(out[p], acc[p]);
+    }
+    // Bias and activation on the registers (the same values as
+    // BiasActivate: max/min return the zero or six where the comparisons
+    // there pick them).
+    template <int P>
+    static __attribute__((target("avx2"))) inline void RunStore(const float* const* x, size_t rowStep, int kh, int kw,
+                                                                int cin, const float* w, const float* bias, int n,
+                                                                Act act, float* const* out) {
+        float acc[P][kBlock];
+        Run<P>(x, rowStep, kh, kw, cin, w, acc);
+        const __m256 b = _mm256_loadu_ps(bias), zero = _mm256_setzero_ps();
+        for (int p = 0; p < P; ++p) {
+            __m256 v = _mm256_add_ps(_mm256_loadu_ps(acc[p]), b);
+            switch (act) {
+                case Act::Relu: v = _mm256_max_ps(v, zero); break;
+                case Act::Relu6: v = _mm256_min_ps(_mm256_max_ps(v, zero), _mm256_set1_ps(6.0f)); break;
+                case Act::Leaky:
+                    v = _mm256_blendv_ps(_mm256_mul_ps(v, _mm256_set1_ps(0.1f)), v, _mm256_cmp_ps(v, zero, _CMP_GT_OQ));
+                    break;
+                case Act::None:
+                default: break;
+            }
+            if (n == kBlock) {
+                _mm256_storeu_ps(out[p], v);
+            } else {
+                float t[kBlock];
+                _mm256_storeu_ps(t, v);
+                for (int k = 0; k < n; ++k) out[p][k] = t[k];
+            }
+        }
     }
 };
 __attribute__((target("avx2"), flatten)) void ConvWide(const ConvJob& j) { ConvLoops<Avx2Kernel, 8>(j); }
@@ -350,7 +390,7 @@ struct NeonDepthwise {
         vst1q_f32(out, acc);
     }
 };
-void ConvWide(const ConvJob& j) { ConvLoops<NeonKernel, 4>(j); }
+void ConvWide(const ConvJob& j) { ConvLoops<Stored<NeonKernel>, 4>(j); }
 void DepthwiseWide(const DepthwiseJob& j) { DepthwiseLoops<NeonDepthwise>(j); }
 bool UseWide(KernelChoice k) { return k != KernelChoice::Portable; }
 #else
