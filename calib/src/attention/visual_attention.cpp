@@ -105,6 +105,7 @@ float Tanh(float x) {
 inline float Phi(float x) { return 1.716f * Tanh(2.0f * x / 3.0f); }
 
 // Linear stretch of an 8-bit map to 0..255; a constant map becomes 127.
+// Only 256 inputs exist, so the stretch is tabulated.
 void LinearStretch(uint8_t* map, int32_t n) {
     uint8_t mn = 255, mx = 0;
     for (int32_t i = 0; i < n; ++i) {
@@ -116,9 +117,11 @@ void LinearStretch(uint8_t* map, int32_t n) {
         return;
     }
     const float range = static_cast<float>(mx - mn);
-    for (int32_t i = 0; i < n; ++i) {
-        map[i] = ClampByte(std::floor(static_cast<float>(map[i] - mn) / range * 255.0f));
+    uint8_t table[256];
+    for (int32_t v = mn; v <= mx; ++v) {
+        table[v] = ClampByte(std::floor(static_cast<float>(v - mn) / range * 255.0f));
     }
+    for (int32_t i = 0; i < n; ++i) map[i] = table[map[i]];
 }
 
 // Float to byte with stretching: min starts at 255 and max at 0.
@@ -553,15 +556,19 @@ int32_t VisualAttention::iRGB2YCbCr(const MIPlane* rgb, MIPlane* ycbcr) {
     const ImagePlane &g = *rgb->planes[0], &b = *rgb->planes[1], &r = *rgb->planes[2];
     ImagePlane &py = *ycbcr->planes[0], &pcb = *ycbcr->planes[1], &pcr = *ycbcr->planes[2];
     for (int32_t y = 0; y < rgb->height; ++y) {
+        const uint8_t* pr = r.pConstPixel + static_cast<ptrdiff_t>(y) * r.stride;
+        const uint8_t* pg = g.pConstPixel + static_cast<ptrdiff_t>(y) * g.stride;
+        const uint8_t* pb = b.pConstPixel + static_cast<ptrdiff_t>(y) * b.stride;
+        uint8_t* oy = py.pPixel + static_cast<ptrdiff_t>(y) * py.stride;
+        uint8_t* ocb = pcb.pPixel + static_cast<ptrdiff_t>(y) * pcb.stride;
+        uint8_t* ocr = pcr.pPixel + static_cast<ptrdiff_t>(y) * pcr.stride;
         for (int32_t x = 0; x < rgb->width; ++x) {
-            const int32_t R = r.pConstPixel[y * r.stride + x];
-            const int32_t G = g.pConstPixel[y * g.stride + x];
-            const int32_t B = b.pConstPixel[y * b.stride + x];
+            const int32_t R = pr[x], G = pg[x], B = pb[x];
             const int32_t cb = -169 * R - 331 * G + 500 * B;
             const int32_t cr = 500 * R - 419 * G - 81 * B;
-            py.pPixel[y * py.stride + x] = static_cast<uint8_t>((299 * R + 587 * G + 114 * B) / 1000);
-            pcb.pPixel[y * pcb.stride + x] = static_cast<uint8_t>(cb >= 127000 ? 255 : cb / 1000 + 128);
-            pcr.pPixel[y * pcr.stride + x] = static_cast<uint8_t>(cr >= 127000 ? 255 : cr / 1000 + 128);
+            oy[x] = static_cast<uint8_t>((299 * R + 587 * G + 114 * B) / 1000);
+            ocb[x] = static_cast<uint8_t>(cb >= 127000 ? 255 : cb / 1000 + 128);
+            ocr[x] = static_cast<uint8_t>(cr >= 127000 ? 255 : cr / 1000 + 128);
         }
     }
     return 0;

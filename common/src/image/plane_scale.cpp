@@ -32,15 +32,22 @@ void ScaleStep(uint8_t* dst, int32_t dw, int32_t dh, int32_t ds, const uint8_t* 
     }
     const AxisSampler xs(sw, dw);
     const AxisSampler ys(sh, dh);
-    for (int32_t y = 0; y < dh; ++y) {
-        const AxisSample row = ys.At(y, 1);
-        const uint8_t* top = src + static_cast<ptrdiff_t>(row.offset0) * ss;
-        const uint8_t* bottom = src + static_cast<ptrdiff_t>(row.offset1) * ss;
-        uint8_t* d = dst + static_cast<ptrdiff_t>(y) * ds;
-        for (int32_t x = 0; x < dw; ++x) {
-            const AxisSample col = xs.At(x, 1);
-            d[x] = static_cast<uint8_t>(Bilinear(top[col.offset0], top[col.offset1], bottom[col.offset0],
-                                                 bottom[col.offset1], col.weight, row.weight));
+    // Column samples in blocks, so that the step needs no heap memory.
+    constexpr int32_t kBlock = 256;
+    AxisSample cols[kBlock];
+    for (int32_t bx = 0; bx < dw; bx += kBlock) {
+        const int32_t n = dw - bx < kBlock ? dw - bx : kBlock;
+        for (int32_t i = 0; i < n; ++i) cols[i] = xs.At(bx + i, 1);
+        for (int32_t y = 0; y < dh; ++y) {
+            const AxisSample row = ys.At(y, 1);
+            const uint8_t* top = src + static_cast<ptrdiff_t>(row.offset0) * ss;
+            const uint8_t* bottom = src + static_cast<ptrdiff_t>(row.offset1) * ss;
+            uint8_t* d = dst + static_cast<ptrdiff_t>(y) * ds + bx;
+            for (int32_t i = 0; i < n; ++i) {
+                const AxisSample& col = cols[i];
+                d[i] = static_cast<uint8_t>(Bilinear(top[col.offset0], top[col.offset1], bottom[col.offset0],
+                                                     bottom[col.offset1], col.weight, row.weight));
+            }
         }
     }
 }
