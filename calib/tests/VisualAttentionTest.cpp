@@ -17,7 +17,7 @@
 
 namespace {
 
-constexpr uint64_t RECORDED_MAP_HASH = 5431925303883962760ull;
+constexpr uint64_t RECORDED_MAP_HASH = 9310472128566257264ull;
 
 // An RGB plane (format 4) from packed RGB pixels.
 void Fill(MIPlane& plane, const std::vector<uint8_t>& rgb, int w, int h) {

@@ -100,7 +100,8 @@ int32_t ImagePlaneT<T>::iInit(int32_t w, int32_t h) {
     if (w <= 0 || h <= 0 || !IsFresh()) return IMAGEPLANE_ERR_INIT;
     const int64_t s = (static_cast<int64_t>(w) + 15) / 16 * 16;
     if (s > INT32_MAX || !FitsBuffer<T>(static_cast<int32_t>(s), h)) return IMAGEPLANE_ERR_INIT;
-    T* buf = new (std::nothrow) T[static_cast<size_t>(s) * static_cast<size_t>(h)];
+    // Zeroed, so that a map that a step leaves alone reads the same everywhere.
+    T* buf = new (std::nothrow) T[static_cast<size_t>(s) * static_cast<size_t>(h)]();
     if (buf == nullptr) {
         iReset();
         return IMAGEPLANE_ERR_INIT;
