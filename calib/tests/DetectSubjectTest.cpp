@@ -80,7 +80,7 @@ TEST(DetectSubjectTest, AcceptsSmallestPhotoEveryOrderAndBothPitchSigns) {
         {CA_COLOR_ORDER_RGB, 3, false, 0}, {CA_COLOR_ORDER_BGR, 3, true, 0}, {CA_COLOR_ORDER_RGBA, 4, false, 0},
         {CA_COLOR_ORDER_BGRA, 4, true, 0}, {CA_COLOR_ORDER_ARGB, 4, false, 0},
         {static_cast<_CAColorOrder>(7), 3, false, 2},  // LAB is no host order: no plane conversion
-        {static_cast<_CAColorOrder>(9), 3, false, 2},
+        {static_cast<_CAColorOrder>(5), 4, false, 2},  // ABGR: no host order either
     };
     const int w = 240, h = 240;
     for (const Row& r : rows) {
@@ -378,6 +378,25 @@ TEST(DetectSubjectTest, ParameterCheckShiftsLevelsAndRefusesBadSets) {
     p.SalRectFlag = 0;
     p.SalRectThreshMode = 9;  // not checked without rectangles
     EXPECT_EQ(p.iPrmCheck(), 1);
+}
+
+// Threshold mode 0: the list keeps the rectangles of the last threshold of
+// the sweep.
+TEST(DetectSubjectTest, ThresholdSweepKeepsTheLastRectangles) {
+    CAinterface ca;
+    ca.param.SalRectThreshMode = 0;
+    ca.param.SalRectThreshStart = 0.2f;
+    ca.param.SalRectThreshEnd = 0.3f;
+    ca.param.SalRectThreshStep = 0.1f;
+    std::vector<uint8_t> photo = attention_test::MakePhoto(320, 240);
+    ZbmImagePtr img(ZbiuCreateAttatchData(photo.data(), 320, 240, 960, ZBM_PIXEL_ORDER_RGB));
+    MIPlane* plane = ca.CreateMIPlane(img.get());
+    ASSERT_NE(plane, nullptr);
+    VAArrange list;
+    EXPECT_EQ(ca.Detect(plane, nullptr, &list), 0u);
+    ca.DisposeMIPlane(&plane);
+    EXPECT_GT(list.num, 0);
+    for (int i = 0; i < list.num; ++i) EXPECT_GE(list.val[i], 77) << i;  // ceil(0.3 x 255)
 }
 
 }  // namespace

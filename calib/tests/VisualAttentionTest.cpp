@@ -4,6 +4,7 @@
 // of a fixed picture.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -234,6 +235,51 @@ TEST(VisualAttentionTest, FaceDetectionInsideTheSaliencyComputation) {
     EXPECT_GT(painted, 0);
     EXPECT_EQ(face->pConstPixel[66 * face->stride + 106], 68);  // inside the square's windows
     EXPECT_EQ(face->pConstPixel[200 * face->stride + 300], 0);
+}
+
+// Every other feature kind and the plain (unlearned) combination: intensity
+// from RGB, red-green and blue-yellow, Gabor orientations, the first edge
+// algorithm, 6-tap pyramids and the full difference of Gaussians. The most
+// salient rectangle lies on the strongest object (the yellow square).
+TEST(VisualAttentionTest, OtherFeatureKindsAndPlainWeights) {
+    ParamMem p;
+    p.FeatureIntensity = 1;
+    p.FeatureIntensityY = 0;
+    p.FeatureColorRGB = 1;
+    p.FeatureColorCrCb = 0;
+    p.FeatureOriGabor = 1;
+    p.EdgeAlgo = 1;
+    p.PyramidNumTap = 6;
+    p.NormReductionFlag = 0;
+    p.WeightLearningFlag = 0;
+    p.ConvBndHandle = 1;
+    p.SalRectGradFlag = 0;
+    p.SalRectThreshMode = 1;
+    MIPlane plane;
+    Fill(plane, attention_test::MakePhoto(320, 240), 320, 240);
+    VisualAttention va;
+    ASSERT_EQ(va.iInit(&plane, &p), 0);
+    EXPECT_EQ(va.FeatureCount(), 12);
+    ASSERT_EQ(va.iCreateSaliency(), 0);
+    ImagePlane* sal = nullptr;
+    ASSERT_EQ(va.iGetSaliencyMap(&sal), 0);
+    int lo = 255, hi = 0;
+    for (int i = 0; i < sal->width * sal->height; ++i) lo = std::min<int>(lo, sal->pBuf[i]), hi = std::max<int>(hi, sal->pBuf[i]);
+    EXPECT_LT(lo, hi);
+    int32_t count = 0;
+    tagVA_RECT* rects = nullptr;
+    ASSERT_EQ(va.iGetSaliencyRect(&count, &rects), 0);
+    ASSERT_GT(count, 0);
+    // No gradient map was asked for.
+    ImagePlane* grad = nullptr;
+    EXPECT_EQ(va.iGetGradientSaliencyMap(&grad), static_cast<int32_t>(VA_ERR_SALIENCY_CALL));
+    // The same picture in YCbCr runs the RGB features from the converted planes.
+    MIPlane ycc;
+    ASSERT_EQ(ycc.iInit(320, 240, 2), 0);
+    ASSERT_EQ(VisualAttention::iRGB2YCbCr(&plane, &ycc), 0);
+    VisualAttention va2;
+    ASSERT_EQ(va2.iInit(&ycc, &p), 0);
+    ASSERT_EQ(va2.iCreateSaliency(), 0);
 }
 
 }  // namespace
