@@ -10,6 +10,15 @@
 
 namespace orielcore_VA {
 
+namespace {
+
+// Resampling of a level image to the size of a scale.
+bool AffineBilinear(uint8_t* dst, int32_t dw, int32_t dh, const uint8_t* src, int32_t sw, int32_t sh, int32_t ss) {
+    return IIScaleImage(dst, dw, dh, dw, src, sw, sh, ss) == 0;
+}
+
+}  // namespace
+
 // ------------------------------------------------------------------ list
 
 SPooledList::SPooledList() : pool_(nullptr), poolSize_(0) {
@@ -332,8 +341,7 @@ void PixDifTreeDetector::EvalPixDifTreeMultiLayerCore(const uint8_t* pixels, int
                 EvalPixDifTreeImage(levelImage, lw, lh, ls, list);
             } else {
                 const int32_t sw = static_cast<int32_t>(w * s), sh = static_cast<int32_t>(h * s);
-                if (sw > bufWidth_ || sh > bufHeight_ ||
-                    IIScaleImage(fullBuf_, sw, sh, sw, levelImage, lw, lh, ls) != 0) {
+                if (sw > bufWidth_ || sh > bufHeight_ || !AffineBilinear(fullBuf_, sw, sh, levelImage, lw, lh, ls)) {
                     break;
                 }
                 EvalPixDifTreeImage(fullBuf_, sw, sh, sw, list);
@@ -343,9 +351,9 @@ void PixDifTreeDetector::EvalPixDifTreeMultiLayerCore(const uint8_t* pixels, int
             const int32_t nw = lw / 2, nh = lh / 2;
             if (nw < 1 || nh < 1) break;
             if (levelImage == pixels) {
-                if (IIScaleImage(quarterBuf_, nw, nh, nw, pixels, lw, lh, ls) != 0) break;
+                if (!AffineBilinear(quarterBuf_, nw, nh, pixels, lw, lh, ls)) break;
             } else {
-                if (IIScaleImage(fullBuf_, nw, nh, nw, quarterBuf_, lw, lh, ls) != 0) break;
+                if (!AffineBilinear(fullBuf_, nw, nh, quarterBuf_, lw, lh, ls)) break;
                 std::memcpy(quarterBuf_, fullBuf_, static_cast<size_t>(nw) * static_cast<size_t>(nh));
             }
             levelImage = quarterBuf_;
