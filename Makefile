@@ -6,9 +6,9 @@
 PRESETS      ?= default asan armhf fuzz
 FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
-                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user
+                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev
 
-.PHONY: all deps build test demo fuzz bench install clean $(addprefix test-,$(PRESETS))
+.PHONY: all deps build test demo fuzz bench install clean sample-photos
 
 all: build
 
@@ -29,12 +29,16 @@ build: deps
 	cmake --preset default
 	cmake --build --preset default
 
-test: deps $(addprefix test-,$(PRESETS))
+test: deps sample-photos $(addprefix test-,$(PRESETS))
 
-test-%:
+# Not .PHONY: make skips pattern rules for phony targets; FORCE keeps them
+# running every time.
+test-%: FORCE
 	cmake --preset $*
 	cmake --build --preset $*
 	ctest --preset $*
+
+FORCE:
 
 demo: build
 	./build/default/tools/lumicor_demo/lumicor_demo
@@ -53,6 +57,19 @@ bench: build
 
 install: build
 	cmake --install build/default
+
+# Sample photos for the similarity quality check (tools/siml_rank): the demo
+# JPEGs of an npm package, kept under build/cache. Best effort: without them
+# the check is skipped.
+PHOTO_PACKAGE = @vladmandic/face-api@1.7.15
+PHOTO_CACHE   = build/cache/face-api
+sample-photos:
+	@if [ -f $(PHOTO_CACHE)/package/demo/sample1.jpg ]; then exit 0; fi; \
+	if ! command -v npm >/dev/null; then echo "npm not found: sample photos not fetched, quality check skipped"; exit 0; fi; \
+	mkdir -p $(PHOTO_CACHE) && cd $(PHOTO_CACHE) && \
+	tgz=$$(npm pack --silent $(PHOTO_PACKAGE) 2>/dev/null | tail -n 1) && [ -f "$$tgz" ] && \
+	tar xzf "$$tgz" --wildcards 'package/demo/*.jpg' && rm -f "$$tgz" || \
+	echo "sample photos could not be fetched: quality check skipped"
 
 clean:
 	rm -rf build
