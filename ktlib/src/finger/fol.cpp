@@ -354,7 +354,7 @@ float FingerScoreOfMean(float m) {
 // One contour of one scale: adjusted, closed, measured and scored. A
 // contour that is not a finger leaves `finger` with score 0.
 int EvaluateContour(const Detector& detector, FeRVLHandler& handler, const zbmvector<zbm_Pos>& contour,
-                    int32_t scale, PatchObserver* observer, Finger& finger) {
+                    int32_t scale, int32_t index, PatchObserver* observer, Finger& finger) {
     const _zbm_Image* image = detector.Image();
     const int32_t w = image->width, h = image->height;
     finger.score = 0.0f;
@@ -393,7 +393,7 @@ int EvaluateContour(const Detector& detector, FeRVLHandler& handler, const zbmve
         float value = 0.0f;
         status = handler.EvalImagePatch(image, rect, pattern, &value);
         if (status != KT_OK) return status;
-        if (observer) observer->OnPatch(handler.WorkImage(), pattern, p.x, p.y, scale, value);
+        if (observer) observer->OnPatch(handler.WorkImage(), pattern, p.x, p.y, scale, index, value);
         sum += value;
         ++count;
     }
@@ -411,7 +411,7 @@ int DetectAtScale(const _zbm_Image* image, FeRVLHandler& handler, int32_t scale,
     for (int32_t c = 0; c < contours.size(); ++c) {
         if (contours[c].size() <= 1) continue;
         Finger finger = {};
-        status = EvaluateContour(detector, handler, contours[c], scale, observer, finger);
+        status = EvaluateContour(detector, handler, contours[c], scale, c, observer, finger);
         if (status != KT_OK || finger.score <= 0.0f) {
             finger.Clear();
             if (status != KT_OK) return status;

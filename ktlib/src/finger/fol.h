@@ -110,8 +110,9 @@ class PatchObserver {
 public:
     virtual ~PatchObserver() {}
     // patch: the turned 10 x 10 RGB patch; (x, y): the outline point in
-    // normalised coordinates; scale: 0..5.
-    virtual void OnPatch(const _zbm_Image* patch, int32_t pattern, float x, float y, int32_t scale, float score) = 0;
+    // normalised coordinates; scale: 0..5; contour: its index at that scale.
+    virtual void OnPatch(const _zbm_Image* patch, int32_t pattern, float x, float y, int32_t scale, int32_t contour,
+                         float score) = 0;
 };
 
 // Fingers of a colour image, with the photo's finger-on-lens score (the best
