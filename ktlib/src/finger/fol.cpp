@@ -322,6 +322,17 @@ float FeRVLHandler::EvalImagePatch(const _zbm_Image* image, const zbm_Rect& rect
     return EvalImagePatch(image, rect, pattern, &score) == KT_OK ? score : -FLT_MAX;
 }
 
+float FingerScoreOfMean(float m) {
+    float v = m / 2.5f;
+    if (v > 0.167f)
+        v = (v - 0.167f) * 0.4f / 0.833f + 0.6f;
+    else
+        v = v * 3.5928147f;
+    if (v > 1.0f) v = 1.0f;
+    if (v < 0.0f) v = 0.0f;
+    return v;
+}
+
 int32_t FingerPatternOfAngle(double angle) {
     const double e = kPi / 8.0;
     if (angle < -7.0 * e || angle >= 7.0 * e) return 4;
@@ -337,19 +348,6 @@ int32_t FingerPatternOfAngle(double angle) {
 // ---------------------------------------------------------------- detection
 
 namespace {
-
-// Maps the mean patch score to the finger score in [0, 1]: 0.4175 (0.167 after
-// the division) is the 0.6 mark.
-float FingerScoreOfMean(float m) {
-    float v = m / 2.5f;
-    if (v > 0.167f)
-        v = (v - 0.167f) * 0.4f / 0.833f + 0.6f;
-    else
-        v = v * 3.5928147f;
-    if (v > 1.0f) v = 1.0f;
-    if (v < 0.0f) v = 0.0f;
-    return v;
-}
 
 // One contour of one scale: adjusted, closed, measured and scored. A
 // contour that is not a finger leaves `finger` with score 0.
