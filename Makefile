@@ -8,7 +8,10 @@ FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user
 
-.PHONY: all deps build test demo fuzz bench install clean $(addprefix test-,$(PRESETS))
+# Training the finger-on-lens patch dictionaries (tools/train/README.md).
+TRAIN_DEB_PACKAGES = python3-numpy python3-scipy python3-sklearn python3-skimage python3-pil npm
+
+.PHONY: all deps build test demo fuzz bench install clean train-fervl $(addprefix test-,$(PRESETS))
 
 all: build
 
@@ -50,6 +53,22 @@ fuzz: deps
 
 bench: build
 	@for b in build/default/lumicor_bench build/default/bench_*; do [ -x $$b ] && $$b; done; true
+
+train-fervl: build
+	@missing=""; for p in $(TRAIN_DEB_PACKAGES); do \
+	  dpkg-query -W -f='$${Status}' $$p 2>/dev/null | grep -q "install ok installed" || missing="$$missing $$p"; \
+	done; \
+	if [ -n "$$missing" ]; then \
+	  if [ "$$(id -u)" = 0 ]; then \
+	    apt-get update -qq && DEBIAN_FRONTEND=noninteractive apt-get install -y -qq $$missing; \
+	  else \
+	    echo "missing Debian packages:$$missing (run as root or install them)"; exit 1; \
+	  fi; \
+	fi
+	cmake --build build/default --target fervl_patches
+	/usr/bin/python3 tools/train/train_fervl.py
+	cmake --build build/default --target fervl_patches
+	/usr/bin/python3 tools/train/train_fervl.py --evaluate --reuse
 
 install: build
 	cmake --install build/default

@@ -60,6 +60,22 @@ TEST(BlurScorerTest, LiftingKillsCubicsAndPutsTheLastDetailAtTheEndOfOddRows) {
     EXPECT_EQ(one[0], 5.0);
 }
 
+TEST(BlurScorerTest, TwoLevelsAreRowsThenColumnsOfEachRegion) {
+    ZbmImagePtr gray = lumicor::test::MakeNoiseImage(37, 29, ZBM_PIXEL_ORDER_GRAY, 8);
+    std::vector<double> expected(37 * 29), line(37), scratch(37);
+    for (int32_t i = 0; i < 37 * 29; ++i) expected[i] = gray->pData[i];
+    int32_t w = 37, h = 29;
+    for (int level = 0; level < 2; ++level, w /= 2, h /= 2) {
+        for (int32_t y = 0; y < h; ++y) blur::Cohen::Transform1D(&expected[y * 37], w, 1, scratch.data());
+        for (int32_t x = 0; x < w; ++x) blur::Cohen::Transform1D(&expected[x], h, 37, scratch.data());
+    }
+    blur::Cohen cohen;
+    ASSERT_EQ(cohen.Initialize(gray->pData, 37, 29), KT_OK);
+    EXPECT_EQ(cohen.Levels(), 4);
+    ASSERT_EQ(cohen.ForwardTransform(2), KT_OK);
+    for (int32_t i = 0; i < 37 * 29; ++i) ASSERT_EQ(cohen.Data()[i], expected[i]) << i;
+}
+
 TEST(BlurScorerTest, SubbandBlockMapDividesByTheNumberOfCells) {
     std::vector<double> ones(12 * 12, 1.0);
     blur::Subband subband(blur::kDirectionDiagonal);

@@ -154,6 +154,10 @@ public:
     static void Transform1D(double* values, int32_t n, int32_t stride, double* scratch);
 
 private:
+    // Transform1D down every column of the top-left w x h region; scratch
+    // holds w x h values.
+    void TransformColumns(int32_t w, int32_t h, double* scratch);
+
     static const int32_t kMaxLevels = 32;
     int32_t width_;
     int32_t height_;
