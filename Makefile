@@ -6,12 +6,12 @@
 PRESETS      ?= default asan armhf fuzz
 FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
-                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user
+                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev
 
 # Training the finger-on-lens patch dictionaries (tools/train/README.md).
 TRAIN_DEB_PACKAGES = python3-numpy python3-scipy python3-sklearn python3-skimage python3-pil npm
 
-.PHONY: all deps build test demo fuzz bench install clean train-fervl $(addprefix test-,$(PRESETS))
+.PHONY: all deps build test demo fuzz bench install clean sample-photos train-fervl
 
 all: build
 
@@ -32,12 +32,16 @@ build: deps
 	cmake --preset default
 	cmake --build --preset default
 
-test: deps $(addprefix test-,$(PRESETS))
+test: deps sample-photos $(addprefix test-,$(PRESETS))
 
-test-%:
+# Not .PHONY: make skips pattern rules for phony targets; FORCE keeps them
+# running every time.
+test-%: FORCE
 	cmake --preset $*
 	cmake --build --preset $*
 	ctest --preset $*
+
+FORCE:
 
 demo: build
 	./build/default/tools/lumicor_demo/lumicor_demo
@@ -54,7 +58,7 @@ fuzz: deps
 bench: build
 	@for b in build/default/lumicor_bench build/default/bench_*; do [ -x $$b ] && $$b; done; true
 
-train-fervl: build
+train-fervl: build sample-photos
 	@missing=""; for p in $(TRAIN_DEB_PACKAGES); do \
 	  dpkg-query -W -f='$${Status}' $$p 2>/dev/null | grep -q "install ok installed" || missing="$$missing $$p"; \
 	done; \
@@ -72,6 +76,19 @@ train-fervl: build
 
 install: build
 	cmake --install build/default
+
+# Sample photos for the similarity quality check (tools/siml_rank): the demo
+# JPEGs of an npm package, kept under build/cache. Best effort: without them
+# the check is skipped.
+PHOTO_PACKAGE = @vladmandic/face-api@1.7.15
+PHOTO_CACHE   = build/cache/face-api
+sample-photos:
+	@if [ -f $(PHOTO_CACHE)/package/demo/sample1.jpg ]; then exit 0; fi; \
+	if ! command -v npm >/dev/null; then echo "npm not found: sample photos not fetched, quality check skipped"; exit 0; fi; \
+	mkdir -p $(PHOTO_CACHE) && cd $(PHOTO_CACHE) && \
+	tgz=$$(npm pack --silent $(PHOTO_PACKAGE) 2>/dev/null | tail -n 1) && [ -f "$$tgz" ] && \
+	tar xzf "$$tgz" --wildcards 'package/demo/*.jpg' && rm -f "$$tgz" || \
+	echo "sample photos could not be fetched: quality check skipped"
 
 clean:
 	rm -rf build

@@ -38,3 +38,10 @@ foreach(area ${LUMICOR_AREAS})
     gtest_discover_tests(${area}_tests DISCOVERY_TIMEOUT 120 PROPERTIES TIMEOUT 600)
   endif()
 endforeach()
+
+# The installed library, headers, pkg-config file and CMake package work for a
+# C host program.
+if(NOT CMAKE_CROSSCOMPILING AND NOT LUMICOR_SANITIZE)
+  add_test(NAME install.consumer
+           COMMAND sh ${PROJECT_SOURCE_DIR}/tests/install/check_install.sh ${PROJECT_BINARY_DIR})
+endif()

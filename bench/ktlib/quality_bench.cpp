@@ -57,7 +57,6 @@ void BM_CalcFingerScore_80x60(benchmark::State& state) {
 }
 BENCHMARK(BM_CalcFingerScore_80x60)->Unit(benchmark::kMillisecond);
 
-#if __has_include("ktlib/src/representative/bad_exposure.h")
 void BM_KtRepmExtract_640x480(benchmark::State& state) {
     ZbmImagePtr rgb = Photo(640, 480);
     _KtMetaSimilarity siml;
@@ -78,6 +77,5 @@ void BM_KtRepmExtract_640x480(benchmark::State& state) {
     }
 }
 BENCHMARK(BM_KtRepmExtract_640x480)->Unit(benchmark::kMillisecond);
-#endif
 
 }  // namespace

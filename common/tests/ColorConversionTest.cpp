@@ -109,6 +109,11 @@ TEST(ColorConversionTest, IntegerSquareRoot) {
         const uint64_t r = isqrt(n);
         ASSERT_TRUE(r * r <= n && (r + 1) * (r + 1) > n) << n;
     }
+    // The boundaries where a rounded root could slip to the next integer.
+    for (uint32_t k = 1; k < 65536; ++k) {
+        ASSERT_EQ(isqrt(k * k), k);
+        ASSERT_EQ(isqrt(k * k - 1), k - 1);
+    }
     EXPECT_EQ(isqrt7(99), 9u);
 }
 

@@ -167,7 +167,6 @@ TEST(RepresentativeExtractTest, WorkingResultsAreTheSameOnEveryTarget) {
     fingers.Clear();
 }
 
-#if __has_include("ktlib/src/representative/bad_exposure.h")
 
 TEST(RepresentativeExtractTest, RefusedArguments) {
     std::vector<uint8_t> rgb(64 * 48 * 4, 100);
@@ -252,4 +251,3 @@ TEST(RepresentativeExtractTest, EveryFailingAllocationIsReported) {
         });
 }
 
-#endif

@@ -1,23 +1,14 @@
-// Integer square root, used by the texture features where a float root
-// could differ between platforms.
+// Integer square root, used by the texture features.
 #include <lumicor/zbm_image.h>
 
-// Digit-by-digit method in base 4: each round decides one bit of the root.
-uint32_t isqrt(uint32_t n) {
-    uint32_t root = 0;
-    uint32_t bit = 1u << 30;  // highest power of four in 32 bits
-    while (bit > n) bit >>= 2;
-    while (bit != 0) {
-        if (n >= root + bit) {
-            n -= root + bit;
-            root = (root >> 1) + bit;
-        } else {
-            root >>= 1;
-        }
-        bit >>= 2;
-    }
-    return root;
-}
+#include <cmath>
+
+// floor(sqrt(n)) for every 32-bit n. IEEE-754 square root is correctly
+// rounded on every target, and a double holds n exactly; since
+// sqrt(k*k - 1) lies at least 1/(2k) > 2^-17 below k, the rounded root never
+// reaches the next integer, so truncation gives the exact integer root. This
+// is several times faster than the digit-by-digit method in the texture loop.
+uint32_t isqrt(uint32_t n) { return static_cast<uint32_t>(std::sqrt(static_cast<double>(n))); }
 
 uint32_t isqrt1(uint32_t n) { return isqrt(n); }
 uint32_t isqrt2(uint32_t n) { return isqrt(n); }

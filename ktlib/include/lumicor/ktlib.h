@@ -198,6 +198,18 @@ int KtClblParse(const unsigned char* data, unsigned int length, KtFrameHeader* h
 
 /* KT_EXTRACT_FUNCTIONS: KtSimlExtract, KtRepmExtract, KtClblExtract are declared below. */
 
+/* Computes the similarity meta of an image of width x height pixels (the
+ * analysis passes about 160 x 120) into a new record in *out, which must be
+ * NULL on entry. `pitch` is the signed distance in bytes between the starts of
+ * consecutive rows (negative for bottom-up buffers: pixels then points at the
+ * top row). `format`: 0 RGB, 1 BGR (3 bytes), 2 RGBA, 3 BGRA, 4 ARGB (4 bytes).
+ * The pixels are only read. Returns 0; 2 when pixels or out is NULL; 3 for a
+ * zero width or height, *out already set, or |pitch| < width x bytes per
+ * pixel; 13 for a format above 4; 1 for more than 16,000,000 pixels; 4 when
+ * out of memory. */
+int KtSimlExtract(const unsigned char* pixels, unsigned int width, unsigned int height, int pitch,
+                  unsigned int format, _KtMetaSimilarity** out);
+
 /* Computes the representative (quality) meta of a photo into a new record in
  * *out, which must be NULL on entry: colour variation from siml's palette,
  * finger on lens (with up to KT_MAX_FINGERS finger outlines in the pixels of
@@ -212,6 +224,13 @@ int KtClblParse(const unsigned char* data, unsigned int length, KtFrameHeader* h
  * image-function codes pass through. */
 int KtRepmExtract(const unsigned char* pixels, unsigned int width, unsigned int height, int pitch,
                   unsigned int format, const _KtMetaSimilarity* siml, _KtMetaRepresentative** out);
+
+/* Computes the colour labels (pixel-weighted share of white, black, red,
+ * yellow, green and blue palette colours, 0..100 %) of a similarity meta into
+ * a new record in *out, which must be NULL on entry. A meta without palette
+ * counts (ncol32 0) gets 0 everywhere; ncol32 above 32 counts as 32. Returns 0;
+ * 2 when siml or out is NULL; 3 when *out is set; 4 when out of memory. */
+int KtClblExtract(const _KtMetaSimilarity* siml, _KtMetaColorLabel** out);
 
 }  /* extern "C" */
 

@@ -2,9 +2,6 @@
 // about 640 x 480 for the blur scorer (in gray) and to about 80 x 60 for the
 // finger detection; the colour variation comes from the similarity palette
 // and the exposure score from the palette and the blur.
-// TODO(merge): the exposure score arrives with the similarity work; until
-// it is merged this file compiles to nothing.
-#if __has_include("ktlib/src/representative/bad_exposure.h")
 #include <lumicor/ktlib.h>
 #include <lumicor/zbm_image.h>
 
@@ -78,5 +75,3 @@ extern "C" int KtRepmExtract(const unsigned char* pixels, unsigned int width, un
     *out = meta;
     return KT_OK;
 }
-
-#endif
