@@ -25,11 +25,21 @@ std::vector<uint8_t> QualityPhoto(int32_t w, int32_t h) {
         for (int32_t x = 0; x < w; ++x) {
             state = state * 1664525u + 1013904223u;
             const int32_t noise = static_cast<int32_t>((state >> 24) % 21) - 10;
-            int32_t r = 60 + 120 * y / h, g = 90 + 60 * x / w, b = 170 - 80 * y / h;
+            // Coarse texture (blocks of w / 80 pixels) that survives the
+            // reduction to 80 x 60, so that only the blob looks smooth.
+            const uint32_t block = static_cast<uint32_t>((x * 80 / w) * 7919 + (y * 80 / w) * 104729) * 2654435761u;
+            const int32_t texture = static_cast<int32_t>(block >> 26) - 32;
+            int32_t r = 60 + 120 * y / h + texture, g = 90 + 60 * x / w - texture, b = 170 - 80 * y / h + texture;
             if ((x / 6) % 2 == 0 && y < h / 3) r = g = b = 220;
-            const int32_t dx = x, dy = y - h * 3 / 4;
-            const int32_t d2 = dx * dx * 9 / ((w * 2 / 5) * (w * 2 / 5)) * 100 / 9 + dy * dy * 100 / ((h / 4) * (h / 4));
-            if (d2 < 100) r = 225 - d2 / 2, g = 150 - d2 / 3, b = 115 - d2 / 4;
+            // Blob: inside d2 < 100, blended out to d2 = 300 (a defocused edge).
+            const int32_t dx = x * 100 / (w * 2 / 5), dy = (y - h * 3 / 4) * 100 / (h / 3);
+            const int32_t d2 = (dx * dx + dy * dy) / 100;
+            if (d2 < 300) {
+                const int32_t a = d2 < 100 ? 256 : (300 - d2) * 256 / 200;
+                r = (a * (225 - d2 / 8) + (256 - a) * r) / 256;
+                g = (a * (150 - d2 / 10) + (256 - a) * g) / 256;
+                b = (a * (115 - d2 / 12) + (256 - a) * b) / 256;
+            }
             uint8_t* p = &rgb[(static_cast<size_t>(y) * w + x) * 3];
             const int32_t v[3] = {r + noise, g + noise, b + noise};
             for (int c = 0; c < 3; ++c) p[c] = static_cast<uint8_t>(v[c] < 0 ? 0 : (v[c] > 255 ? 255 : v[c]));
@@ -151,19 +161,35 @@ TEST(RepresentativeExtractTest, WorkingResultsAreTheSameOnEveryTarget) {
     hash = Fnv(hash, &scores.outOfFocus, 8);
     hash = Fnv(hash, &scores.cameraShake, 8);
     for (int32_t y = 0; y < map->height; ++y) hash = Fnv(hash, ZbiuGetConstPointer(map, 0, y), map->width);
-    EXPECT_EQ(hash, 0ull) << std::hex << hash;
+    EXPECT_EQ(hash, 0xa6c9c5367b405997ull) << std::hex << hash;
 
+    // The detector's tables (the model's exponentials), the traced and the
+    // smoothed outline, and the finger list.
+    FOL::Detector detector;
+    zbmvector<zbmvector<zbm_Pos>> contours;
+    ASSERT_EQ(detector.DetectInitialRegions(small.get(), FOL::DefaultFingerLiklihood(), contours), KT_OK);
+    ASSERT_EQ(contours.size(), 1);
+    const int32_t cells = small->width * small->height;
+    uint64_t fingerHash = 1469598103934665603ull;
+    fingerHash = Fnv(fingerHash, detector.TextureTable().data, 4 * cells);
+    fingerHash = Fnv(fingerHash, detector.FingerTable().data, 4 * cells);
+    fingerHash = Fnv(fingerHash, detector.EdgeMagnitudeTable().data, 4 * cells);
+    zbmvector<zbm_Pos> adjusted;
+    ASSERT_EQ(detector.AdjustContour(contours[0], adjusted), KT_OK);
+    fingerHash = Fnv(fingerHash, contours[0].data, 8 * contours[0].size());
+    fingerHash = Fnv(fingerHash, adjusted.data, 8 * adjusted.size());
     zbmvector<FOL::Finger> fingers;
     float score = 0.0f;
     ASSERT_EQ(FOL::CalcFingerScore(small.get(), fingers, score), KT_OK);
-    uint64_t fingerHash = Fnv(1469598103934665603ull, &score, 4);
+    fingerHash = Fnv(fingerHash, &score, 4);
     for (const FOL::Finger& f : fingers) {
         fingerHash = Fnv(fingerHash, &f.score, 4);
         fingerHash = Fnv(fingerHash, &f.area, 4);
         for (const FOL::FingerPoint& p : f.points) fingerHash = Fnv(fingerHash, &p, 8);
     }
-    EXPECT_GT(fingers.size(), 0);
-    EXPECT_EQ(fingerHash, 0ull) << std::hex << fingerHash;
+    EXPECT_EQ(fingerHash, 0x2742a86d16a71628ull) << std::hex << fingerHash;
+    contours.Clear();
+    adjusted.Clear();
     fingers.Clear();
 }
 
@@ -232,7 +258,7 @@ TEST(RepresentativeExtractTest, FrameIsTheSameOnEveryTarget) {
     const _KtMetaVersion version = {2, 0};
     const _KtEngineVersion engine = {2, 5, 0x13121700u};
     ASSERT_EQ(KtRepmSerialize(&version, &engine, meta, frame.data(), size), KT_OK);
-    EXPECT_EQ(Fnv(1469598103934665603ull, frame.data(), frame.size()), 0ull)
+    EXPECT_EQ(Fnv(1469598103934665603ull, frame.data(), frame.size()), 0x20d8add1813477fdull)
         << std::hex << Fnv(1469598103934665603ull, frame.data(), frame.size());
     KtRepmDisposeMeta(&meta);
 }
