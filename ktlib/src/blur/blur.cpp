@@ -61,18 +61,11 @@ int EnergyMap::CreateBlurmap(_zbm_Image** out) const {
 // ---------------------------------------------------------------- Subband
 
 int Subband::SetData(const double* source, int32_t stride, int32_t width, int32_t height) {
-    data_.reset();
-    width_ = 0;
-    height_ = 0;
-    if (width <= 0 || height <= 0) return KT_OK;
-    data_ = lmk::NewArray<double>(static_cast<size_t>(width) * static_cast<size_t>(height));
-    if (!data_) return KT_ERR_NO_MEMORY;
-    for (int32_t y = 0; y < height; ++y) {
-        std::copy(source + static_cast<size_t>(y) * stride, source + static_cast<size_t>(y) * stride + width,
-                  data_.get() + static_cast<size_t>(y) * width);
-    }
-    width_ = width;
-    height_ = height;
+    const bool empty = width <= 0 || height <= 0;
+    data_ = empty ? nullptr : source;
+    stride_ = stride;
+    width_ = empty ? 0 : width;
+    height_ = empty ? 0 : height;
     return KT_OK;
 }
 
@@ -83,7 +76,10 @@ int Subband::CalcLogEnergy(double& energy) const {
         return KT_OK;
     }
     double sum = 0.0;
-    for (int32_t i = 0; i < n; ++i) sum += data_[i] * data_[i];
+    for (int32_t y = 0; y < height_; ++y) {
+        const double* row = data_ + static_cast<size_t>(y) * stride_;
+        for (int32_t x = 0; x < width_; ++x) sum += row[x] * row[x];
+    }
     energy = lmk::Log(sum / n + 1.0);
     return KT_OK;
 }
@@ -103,7 +99,7 @@ int Subband::CalcBlockEnergyMap(int32_t blockSize, double overlap, const EnergyM
         for (int32_t i = 0; i < mapWidth; ++i) {
             double sum = 0.0;
             for (int32_t y = j * step; y < j * step + blockSize; ++y) {
-                const double* row = data_.get() + static_cast<size_t>(y) * width_;
+                const double* row = data_ + static_cast<size_t>(y) * stride_;
                 for (int32_t x = i * step; x < i * step + blockSize; ++x) sum += row[x] * row[x];
             }
             map_.At(i, j) = lmk::Log(sum / cells + 1.0);
@@ -208,7 +204,7 @@ int Coefficient::CalcBlockEnergy(int32_t percent, double& energy) const {
         energy = 0.0;
         return KT_OK;
     }
-    lmk::UniqueArray<double> sorted = lmk::NewArray<double>(static_cast<size_t>(count));
+    lmk::UniqueArray<double> sorted = lmk::NewUninitializedArray<double>(static_cast<size_t>(count));
     if (!sorted) return KT_ERR_NO_MEMORY;
     std::copy(map_.Values(), map_.Values() + count, sorted.get());
     std::sort(sorted.get(), sorted.get() + count, std::greater<double>());
@@ -229,7 +225,7 @@ int Cohen::Initialize(const unsigned char* pixels, int32_t width, int32_t height
         count > 0x7FFFFFFFu / sizeof(double)) {
         return KT_ERR_NO_MEMORY;
     }
-    data_ = lmk::NewArray<double>(count);
+    data_ = lmk::NewUninitializedArray<double>(count);
     if (!data_) return KT_ERR_NO_MEMORY;
     for (uint32_t i = 0; i < count; ++i) data_[i] = pixels[i];
     width_ = width;
@@ -273,55 +269,59 @@ void Cohen::Transform1D(double* x, int32_t n, int32_t stride, double* scratch) {
 }
 
 // The column pass of one level: the same lifting as Transform1D, applied to
-// whole rows at once (row 2i is s_i, row 2i+1 is d_i) so that memory is read
-// in order. Every value sees exactly the operations of Transform1D.
+// strips of whole rows at once (row 2i is s_i, row 2i+1 is d_i) so that
+// memory is read in order. Every value sees exactly the operations of
+// Transform1D. scratch holds kStrip x h values.
 void Cohen::TransformColumns(int32_t w, int32_t h, double* scratch) {
     if (h < 2) return;
     const int32_t half = h / 2;
-    double* base = data_.get();
-    auto row = [&](int32_t y) { return base + static_cast<size_t>(y) * width_; };
-    auto s = [&](int32_t i) { return scratch + static_cast<size_t>(i) * w; };
-    auto d = [&](int32_t i) { return scratch + static_cast<size_t>(half + i) * w; };
-    for (int32_t i = 0; i < half; ++i) {
-        std::copy(row(2 * i), row(2 * i) + w, s(i));
-        std::copy(row(2 * i + 1), row(2 * i + 1) + w, d(i));
-    }
-    auto predict = [&](double k) {
-        for (int32_t i = 0; i < half - 1; ++i) {
-            double* di = d(i);
-            const double *a = s(i), *b = s(i + 1);
-            for (int32_t x = 0; x < w; ++x) di[x] += k * (a[x] + b[x]);
+    for (int32_t x0 = 0; x0 < w; x0 += kStrip) {
+        const int32_t n = std::min(kStrip, w - x0);
+        double* base = data_.get() + x0;
+        auto row = [&](int32_t y) { return base + static_cast<size_t>(y) * width_; };
+        auto s = [&](int32_t i) { return scratch + static_cast<size_t>(i) * kStrip; };
+        auto d = [&](int32_t i) { return scratch + static_cast<size_t>(half + i) * kStrip; };
+        for (int32_t i = 0; i < half; ++i) {
+            std::copy(row(2 * i), row(2 * i) + n, s(i));
+            std::copy(row(2 * i + 1), row(2 * i + 1) + n, d(i));
         }
-        double* last = d(half - 1);
-        const double* a = s(half - 1);
-        for (int32_t x = 0; x < w; ++x) last[x] += 2.0 * k * a[x];
-    };
-    auto update = [&](double k) {
-        double* first = s(0);
-        const double* d0 = d(0);
-        for (int32_t x = 0; x < w; ++x) first[x] += 2.0 * k * d0[x];
-        for (int32_t i = 1; i < half; ++i) {
-            double* si = s(i);
-            const double *a = d(i - 1), *b = d(i);
-            for (int32_t x = 0; x < w; ++x) si[x] += k * (a[x] + b[x]);
+        auto predict = [&](double k) {
+            for (int32_t i = 0; i < half - 1; ++i) {
+                double* di = d(i);
+                const double *a = s(i), *b = s(i + 1);
+                for (int32_t x = 0; x < n; ++x) di[x] += k * (a[x] + b[x]);
+            }
+            double* last = d(half - 1);
+            const double* a = s(half - 1);
+            for (int32_t x = 0; x < n; ++x) last[x] += 2.0 * k * a[x];
+        };
+        auto update = [&](double k) {
+            double* first = s(0);
+            const double* d0 = d(0);
+            for (int32_t x = 0; x < n; ++x) first[x] += 2.0 * k * d0[x];
+            for (int32_t i = 1; i < half; ++i) {
+                double* si = s(i);
+                const double *a = d(i - 1), *b = d(i);
+                for (int32_t x = 0; x < n; ++x) si[x] += k * (a[x] + b[x]);
+            }
+        };
+        predict(kAlpha);
+        update(kBeta);
+        predict(kGamma);
+        update(kDelta);
+        for (int32_t i = 0; i < half; ++i) {
+            const double *si = s(i), *di = d(i);
+            double *top = row(i), *bottom = row(half + i);
+            for (int32_t x = 0; x < n; ++x) {
+                top[x] = si[x] / kSmoothScale;
+                bottom[x] = di[x] * kDetailScale;
+            }
         }
-    };
-    predict(kAlpha);
-    update(kBeta);
-    predict(kGamma);
-    update(kDelta);
-    for (int32_t i = 0; i < half; ++i) {
-        const double *si = s(i), *di = d(i);
-        double *top = row(i), *bottom = row(half + i);
-        for (int32_t x = 0; x < w; ++x) {
-            top[x] = si[x] / kSmoothScale;
-            bottom[x] = di[x] * kDetailScale;
+        if (h % 2 != 0) {
+            const double* di = d(half - 1);
+            double* last = row(h - 1);
+            for (int32_t x = 0; x < n; ++x) last[x] = di[x] * kDetailScale;
         }
-    }
-    if (h % 2 != 0) {
-        const double* di = d(half - 1);
-        double* last = row(h - 1);
-        for (int32_t x = 0; x < w; ++x) last[x] = di[x] * kDetailScale;
     }
 }
 
@@ -329,7 +329,8 @@ int Cohen::ForwardTransform(int32_t levels) {
     if (!data_) return KT_ERR_STATE;
     if (levels == 0) levels = levels_;
     if (levels < 0 || levels > levels_) return KT_ERR_STATE;
-    lmk::UniqueArray<double> scratch = lmk::NewArray<double>(static_cast<size_t>(width_) * height_);
+    const size_t scratchSize = static_cast<size_t>(std::max(width_, static_cast<int32_t>(kStrip) * height_));
+    lmk::UniqueArray<double> scratch = lmk::NewUninitializedArray<double>(scratchSize);
     if (!scratch) return KT_ERR_NO_MEMORY;
     for (int32_t k = 0; k < levels; ++k) {
         const int32_t w = regionWidth_[k], h = regionHeight_[k];

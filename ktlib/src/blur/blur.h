@@ -53,17 +53,18 @@ private:
 
 enum Direction { kDirectionRight = 0, kDirectionBelow = 1, kDirectionDiagonal = 2 };
 
-// One orientation of one level.
+// One orientation of one level: a view of the transform's coefficients (the
+// Cohen it was taken from must outlive it).
 class Subband {
 public:
-    explicit Subband(Direction direction) : direction_(direction), width_(0), height_(0) {}
+    explicit Subband(Direction direction) : direction_(direction), data_(nullptr), stride_(0), width_(0), height_(0) {}
     virtual ~Subband() {}
-    // Copies width x height values, rows `stride` values apart. 4 out of memory.
+    // Refers to width x height values, rows `stride` values apart.
     int SetData(const double* source, int32_t stride, int32_t width, int32_t height);
     Direction GetDirection() const { return direction_; }
     int32_t Width() const { return width_; }
     int32_t Height() const { return height_; }
-    const double* Data() const { return data_.get(); }
+    double At(int32_t x, int32_t y) const { return data_[static_cast<size_t>(y) * stride_ + x]; }
     // ln(mean of the squared coefficients + 1); 0 for an empty subband.
     int CalcLogEnergy(double& energy) const;
     // Blocks of blockSize overlapping by trunc(blockSize x overlap); each cell
@@ -72,9 +73,10 @@ public:
 
 private:
     Direction direction_;
+    const double* data_;
+    int32_t stride_;
     int32_t width_;
     int32_t height_;
-    lmk::UniqueArray<double> data_;
     EnergyMap map_;
 };
 
@@ -141,8 +143,9 @@ public:
     // Transforms the first `levels` levels (0: all). 3 when not initialised
     // or more levels are asked for than exist, 4 out of memory.
     int ForwardTransform(int32_t levels);
-    // Detail coefficients of the first `levels` levels. 3 when levels exceeds
-    // the highest usable level (levels - 1), 4 out of memory.
+    // Detail coefficients of the first `levels` levels (views of this
+    // transform's data). 3 when levels exceeds the highest usable level
+    // (levels - 1), 4 out of memory.
     int GetCoefficient(int32_t levels, Coefficient& coefficient) const;
     int32_t Levels() const { return levels_; }
     int32_t RegionWidth(int32_t level) const { return regionWidth_[level]; }
@@ -154,9 +157,10 @@ public:
     static void Transform1D(double* values, int32_t n, int32_t stride, double* scratch);
 
 private:
-    // Transform1D down every column of the top-left w x h region; scratch
-    // holds w x h values.
+    // Transform1D down every column of the top-left w x h region, kStrip
+    // columns at a time; scratch holds kStrip x h values.
     void TransformColumns(int32_t w, int32_t h, double* scratch);
+    static const int32_t kStrip = 16;
 
     static const int32_t kMaxLevels = 32;
     int32_t width_;

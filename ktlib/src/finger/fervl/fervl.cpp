@@ -98,19 +98,25 @@ int FeRVL::whitenPatches(const _FeRVLDictionary& d, const double* patches, uint3
 
 int FeRVL::calcDistance(const _FeRVLDictionary& d, const double* whitened, uint32_t count, double* distances) {
     const uint32_t dim = d.patchDimension;
+    // |y|^2 of every patch first (parked in its centroid-0 slot, which is
+    // filled last); each centroid's |c|^2 is then computed once.
     for (uint32_t p = 0; p < count; ++p) {
         const double* y = whitened + static_cast<size_t>(p) * dim;
         double yy = 0.0;
         for (uint32_t i = 0; i < dim; ++i) yy += y[i] * y[i];
-        for (uint32_t k = 0; k < d.K; ++k) {
-            const double* c = d.centroids[k];
-            double yc = 0.0, cc = 0.0;
-            for (uint32_t i = 0; i < dim; ++i) {
-                yc += y[i] * c[i];
-                cc += c[i] * c[i];
-            }
-            const double sq = yy - 2.0 * yc + cc;
-            distances[static_cast<size_t>(p) * d.K + k] = std::sqrt(sq > 0.0 ? sq : 0.0);
+        distances[static_cast<size_t>(p) * d.K] = yy;
+    }
+    for (uint32_t k = d.K; k-- > 0;) {
+        const double* c = d.centroids[k];
+        double cc = 0.0;
+        for (uint32_t i = 0; i < dim; ++i) cc += c[i] * c[i];
+        for (uint32_t p = 0; p < count; ++p) {
+            const double* y = whitened + static_cast<size_t>(p) * dim;
+            double yc = 0.0;
+            for (uint32_t i = 0; i < dim; ++i) yc += y[i] * c[i];
+            double* out = distances + static_cast<size_t>(p) * d.K;
+            const double sq = out[0] - 2.0 * yc + cc;
+            out[k] = std::sqrt(sq > 0.0 ? sq : 0.0);
         }
     }
     return KT_OK;
