@@ -306,10 +306,11 @@ def main():
     ap.add_argument("--root", default=os.path.abspath(os.path.join(os.path.dirname(__file__), "..", "..")))
     ap.add_argument("--tool", default=None)
     ap.add_argument("--work", default=None)
-    ap.add_argument("--train", type=int, default=1600)
-    ap.add_argument("--heldout", type=int, default=600)
+    ap.add_argument("--train", type=int, default=2000)
+    ap.add_argument("--heldout", type=int, default=700)
     ap.add_argument("--evaluate", action="store_true", help="only measure the tables built into the tool")
     ap.add_argument("--reuse", action="store_true", help="keep photos and patches already in the work folder")
+    ap.add_argument("--output", default=None, help="generated source (default: the library's)")
     args = ap.parse_args()
     root = args.root
     tool = args.tool or os.path.join(root, "build", "default", "tools", "train", "fervl_patches")
@@ -380,7 +381,8 @@ def main():
         d = dict(dictionaries[name])
         d["weights"] = class_weights(d, scale, offset)
         entries.append((cname, prefix, d))
-    fervl_codegen.write(os.path.join(root, "ktlib", "src", "finger", "fervl", "fervl_dictionaries.cpp"), entries,
+    output = args.output or os.path.join(root, "ktlib", "src", "finger", "fervl", "fervl_dictionaries.cpp")
+    fervl_codegen.write(output, entries,
                         "seed %d, %d training photos" % (SEED, args.train))
 
     held = run_patches(tool, os.path.join(work, "heldout"), args.reuse)
