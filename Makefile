@@ -6,7 +6,8 @@
 PRESETS      ?= default asan armhf fuzz
 FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
-                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev
+                clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev \
+                libpng-dev libexif-dev libcli11-dev nlohmann-json3-dev
 
 .PHONY: all deps build test demo fuzz bench install clean sample-photos
 
