@@ -7,9 +7,9 @@ PRESETS      ?= default asan armhf fuzz
 FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev \
-                libpng-dev libexif-dev libcli11-dev nlohmann-json3-dev
+                libpng-dev libexif-dev libcli11-dev nlohmann-json3-dev nodejs
 
-.PHONY: all deps build test demo fuzz bench install clean sample-photos
+.PHONY: all deps build test demo fuzz bench parity install clean sample-photos
 
 all: build
 
@@ -55,6 +55,10 @@ fuzz: deps
 
 bench: build
 	@for b in build/default/lumicor_bench build/default/bench_*; do [ -x $$b ] && $$b; done; true
+
+# Face engine against the face networks' reference pipeline (needs npm).
+parity: build
+	tools/parity/run.sh build/default
 
 install: build
 	cmake --install build/default

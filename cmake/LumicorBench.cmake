@@ -20,5 +20,6 @@ endforeach()
 foreach(b ${bench_groups})
   target_link_libraries(${b} PRIVATE Lumicor_static benchmark::benchmark benchmark::benchmark_main)
   target_include_directories(${b} PRIVATE ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/tests)
-  target_compile_definitions(${b} PRIVATE LUMICOR_SOURCE_DIR="${PROJECT_SOURCE_DIR}")
+  target_compile_definitions(${b} PRIVATE LUMICOR_SOURCE_DIR="${PROJECT_SOURCE_DIR}"
+                                              LUMICOR_FACE_SAMPLES_DIR="${LUMICOR_FACE_SAMPLES_DIR}")
 endforeach()

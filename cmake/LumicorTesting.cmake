@@ -34,7 +34,8 @@ foreach(area ${LUMICOR_AREAS})
     target_link_libraries(${area}_tests PRIVATE lumicor_testkit GTest::gtest_main GTest::gmock ${LUMICOR_TEST_WRAP_LINK})
     target_include_directories(${area}_tests PRIVATE ${PROJECT_SOURCE_DIR})
     target_compile_definitions(${area}_tests PRIVATE LUMICOR_TEST_DATA_DIR="${LUMICOR_TEST_DATA_DIR}"
-                                                     LUMICOR_SOURCE_DIR="${PROJECT_SOURCE_DIR}")
+                                                     LUMICOR_SOURCE_DIR="${PROJECT_SOURCE_DIR}"
+                                                     LUMICOR_FACE_SAMPLES_DIR="${LUMICOR_FACE_SAMPLES_DIR}")
     gtest_discover_tests(${area}_tests DISCOVERY_TIMEOUT 120 PROPERTIES TIMEOUT 600)
   endif()
 endforeach()

@@ -99,6 +99,36 @@ uint32_t CAGetDefaultParam(_CAParam* pParam);
 uint32_t CASearchFraming(uint32_t width, uint32_t height, const _CAParam* pParam,
                          const _CAAttentionAreaArray* pAttentionAreaArray, _CAResult* pResult);
 
+/* Attention areas of one photo: up to 16 rectangles as fractions of a
+ * reduced reference image (longer side at most 40 pixels). With faces given
+ * (pFaceInfoArray non-null, numFaces not 0) the first 16 faces become the
+ * areas, each with its gaze direction code, and isFace is 1; otherwise the
+ * areas are the salient regions of the photo, each with its saliency 0..255.
+ * pBuf (rows rowstride bytes apart, negative for bottom-up) is only read;
+ * |rowstride| must be at least 3 x width for every order. On success the
+ * caller owns pAttentionAreaArray->pAreaArray and releases it with
+ * CADisposeAttentionAreaArray. The same pixels give the same areas on every
+ * device; nothing is kept between calls.
+ * Returns 0; 3 for invalid arguments (null buffer or output, a side below
+ * 240, a short row stride, faces announced without records), before anything
+ * is allocated; 2 when a reduced image or the plane cannot be made (also for
+ * an order outside _CAColorOrder); 4 out of memory; 1 when a step of the
+ * saliency computation fails; 11 when a debug file cannot be opened. On
+ * failure the output is left as it was, except when the record array cannot
+ * be allocated: isFace and numAreas are written and pAreaArray is null. Every
+ * failure prints one line on standard error. */
+uint32_t CADetectSubject(const uint8_t* pBuf, uint32_t width, uint32_t height, int32_t rowstride,
+                         _CAColorOrder order, const _CAFaceInfoArray* pFaceInfoArray,
+                         _CAAttentionAreaArray* pAttentionAreaArray);
+
+/* Frees the record array of an array made by CADetectSubject and sets isFace
+ * and numAreas to 0 and pAreaArray to NULL; an array without records is left
+ * unchanged. Returns 0, or 3 for a null array. */
+uint32_t CADisposeAttentionAreaArray(_CAAttentionAreaArray* array);
+
+/* The library version, "1.2.2.1217" NUL-padded to 16 bytes. */
+_CALibVersion CAGetLibVersion(void);
+
 #ifdef __cplusplus
 } /* extern "C" */
 #endif

@@ -66,6 +66,43 @@ inline uint32_t Bilinear(uint32_t tl, uint32_t tr, uint32_t bl, uint32_t br, uin
     return ((1024u - fy) * (tl * (1024u - fx) + tr * fx) + fy * (bl * (1024u - fx) + br * fx)) >> 20;
 }
 
+// Resampling positions shared by ZbiuResize and IIScaleImage.
+// Byte offsets of the two neighbours along one axis and the 10-bit weight of
+// the second one.
+struct AxisSample {
+    int32_t offset0;
+    int32_t offset1;
+    uint32_t weight;
+};
+
+// Sample k of an axis: position step/2 - 512 + k × step with
+// step = (src << 10) / dst, clamped to 0 .. (src << 10) - 1025 so that both
+// neighbours exist. A one-pixel source has an empty clamp range: every sample
+// then sits on pixel 0 with weight 0.
+class AxisSampler {
+public:
+    AxisSampler(int32_t srcSize, int32_t dstSize)
+        : step_((static_cast<int64_t>(srcSize) << 10) / dstSize),
+          first_(step_ / 2 - 512),
+          max_((static_cast<int64_t>(srcSize) << 10) - 1025),
+          last_(srcSize - 1) {}
+
+    AxisSample At(int32_t k, int32_t scale) const {
+        int64_t pos = first_ + step_ * k;
+        if (pos > max_) pos = max_;
+        if (pos < 0) pos = 0;
+        const int32_t i0 = static_cast<int32_t>(pos >> 10);
+        const int32_t i1 = i0 < last_ ? i0 + 1 : last_;
+        return AxisSample{i0 * scale, i1 * scale, static_cast<uint32_t>(pos & 1023)};
+    }
+
+private:
+    int64_t step_;
+    int64_t first_;
+    int64_t max_;
+    int32_t last_;
+};
+
 inline zbm_PackedUchar ReadPixel(const uint8_t* p, int32_t bpp) {
     zbm_PackedUchar v = {{0, 0, 0, 0}};
     for (int32_t c = 0; c < bpp; ++c) v.v[c] = p[c];

@@ -15,42 +15,6 @@ using namespace lmk::image;
 
 namespace {
 
-// Byte offsets of the two neighbours along one axis and the 10-bit weight of
-// the second one.
-struct AxisSample {
-    int32_t offset0;
-    int32_t offset1;
-    uint32_t weight;
-};
-
-// Sample k of an axis: position step/2 - 512 + k × step with
-// step = (src << 10) / dst, clamped to 0 .. (src << 10) - 1025 so that both
-// neighbours exist. A one-pixel source has an empty clamp range: every sample
-// then sits on pixel 0 with weight 0.
-class AxisSampler {
-public:
-    AxisSampler(int32_t srcSize, int32_t dstSize)
-        : step_((static_cast<int64_t>(srcSize) << 10) / dstSize),
-          first_(step_ / 2 - 512),
-          max_((static_cast<int64_t>(srcSize) << 10) - 1025),
-          last_(srcSize - 1) {}
-
-    AxisSample At(int32_t k, int32_t scale) const {
-        int64_t pos = first_ + step_ * k;
-        if (pos > max_) pos = max_;
-        if (pos < 0) pos = 0;
-        const int32_t i0 = static_cast<int32_t>(pos >> 10);
-        const int32_t i1 = i0 < last_ ? i0 + 1 : last_;
-        return AxisSample{i0 * scale, i1 * scale, static_cast<uint32_t>(pos & 1023)};
-    }
-
-private:
-    int64_t step_;
-    int64_t first_;
-    int64_t max_;
-    int32_t last_;
-};
-
 template <int32_t Bpp>
 int BilinearT(const _zbm_Image* src, _zbm_Image* dst) {
     lmk::UniqueArray<AxisSample> columns = lmk::NewArray<AxisSample>(static_cast<size_t>(dst->width));
