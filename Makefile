@@ -9,7 +9,11 @@ DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenc
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev \
                 libpng-dev libexif-dev libcli11-dev nlohmann-json3-dev nodejs
 
-.PHONY: all deps build test demo fuzz bench parity install clean sample-photos
+# Training the finger-on-lens patch dictionaries (tools/train/README.md);
+# npm comes with the machine's Node.js.
+TRAIN_DEB_PACKAGES = python3-numpy python3-scipy python3-sklearn python3-skimage python3-pil
+
+.PHONY: all deps build test demo fuzz bench parity install clean sample-photos train-fervl
 
 all: build
 
@@ -59,6 +63,22 @@ bench: build
 # Face engine against the face networks' reference pipeline (needs npm).
 parity: build
 	tools/parity/run.sh build/default
+
+train-fervl: build sample-photos
+	@missing=""; for p in $(TRAIN_DEB_PACKAGES); do \
+	  dpkg-query -W -f='$${Status}' $$p 2>/dev/null | grep -q "install ok installed" || missing="$$missing $$p"; \
+	done; \
+	if [ -n "$$missing" ]; then \
+	  if [ "$$(id -u)" = 0 ]; then \
+	    apt-get update -qq && DEBIAN_FRONTEND=noninteractive apt-get install -y -qq $$missing; \
+	  else \
+	    echo "missing Debian packages:$$missing (run as root or install them)"; exit 1; \
+	  fi; \
+	fi
+	cmake --build build/default --target fervl_patches
+	/usr/bin/python3 tools/train/train_fervl.py
+	cmake --build build/default --target fervl_patches
+	/usr/bin/python3 tools/train/train_fervl.py --evaluate --reuse
 
 install: build
 	cmake --install build/default

@@ -14,6 +14,7 @@
 #include "calib/src/arrange/va_arrange.h"
 #include "calib/src/plane/image_plane.h"
 #include "calib/tests/attention_fixtures.h"
+#include "common/src/internal/ppm.h"
 #include "testkit/temp_dir.h"
 
 namespace {
@@ -65,7 +66,7 @@ TEST(AttentionDebugRunTest, WritesMapsAndAnnotatedPhoto) {
                        zbm_PackedUchar{{255, 255, 255, 0}});
     }
     const std::string annotatedPath = prefix + "_areas.ppm";
-    EXPECT_EQ(save_ppm(annotated->pData, w, h, annotatedPath.c_str()), 0);
+    EXPECT_EQ(zbiuSaveToPpm(annotatedPath.c_str(), annotated.get()), 0);
     EXPECT_TRUE(lumicor::test::FileExists(annotatedPath));
 }
 

@@ -150,7 +150,9 @@ TEST(ImagePlaneTest, FreeWritersAndDumps) {
     const uint8_t px[6] = {9, 8, 7, 6, 5, 4};
     ASSERT_EQ(save_pgm(px, 3, 2, dir.File("a.pgm").c_str()), 0);
     EXPECT_EQ(lumicor::test::ReadFileBytes(dir.File("a.pgm")), std::string("P5\n3 2\n255\n\t\b\a\6\5\4", 17));
+    testing::internal::CaptureStdout();
     EXPECT_NE(save_ppm(px, 2, 1, dir.path().c_str()), 0);  // a directory
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "fopen_s() failed\n");
     testing::internal::CaptureStdout();
     EXPECT_NE(save_pgm(px, 3, 2, (dir.path() + "/missing/a.pgm").c_str()), 0);
     EXPECT_EQ(testing::internal::GetCapturedStdout(), "fopen_s() failed\n");

@@ -70,3 +70,15 @@ TEST(PortableMathTest, BitsAreTheSameOnEveryTarget) {
 }
 
 }  // namespace
+
+TEST(PortableMathTest, LogIsWithinAFewUlpsOverTheRange) {
+    uint64_t worst = 0;
+    for (double x = 1e-300; x < 1e300; x *= 1.0137) worst = std::max(worst, Ulps(lmk::Log(x), std::log(x)));
+    for (double x = 0.5; x < 2.0; x += 0.000173) worst = std::max(worst, Ulps(lmk::Log(x), std::log(x)));
+    EXPECT_LE(worst, 2u);
+    EXPECT_EQ(lmk::Log(1.0), 0.0);
+    EXPECT_NEAR(lmk::Log(4.9e-324), std::log(4.9e-324), 1e-12);  // subnormal argument
+    EXPECT_EQ(lmk::Log(0.0), -std::numeric_limits<double>::infinity());
+    EXPECT_EQ(lmk::Log(std::numeric_limits<double>::infinity()), std::numeric_limits<double>::infinity());
+    EXPECT_TRUE(std::isnan(lmk::Log(-1.0)));
+}

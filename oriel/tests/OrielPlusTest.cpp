@@ -345,6 +345,9 @@ TEST_F(OrielPlusTest, CacheBufferServesMatchingCalls) {
 // Every allocation of a detection (instance, image copy, arenas, arrays)
 // may fail: the call then reports it, leaves no array and leaks nothing.
 TEST(OrielPlusFaultTest, DetectionSurvivesEveryAllocationFailure) {
+#if defined(__arm__)
+    GTEST_SKIP() << "allocation-failure sweep runs on the native build";
+#endif
     oriel_test::Photo photo = oriel_test::Sample(3);
     const bool withFace = !photo.Empty();
     if (!withFace) {

@@ -11,8 +11,8 @@
 #include "calib/src/arrange/va_arrange.h"
 #include "calib/src/attention/visual_attention.h"
 #include "calib/src/plane/image_plane.h"
-#include "calib/src/plane/pnm_writer.h"
 #include "common/src/internal/memory.h"
+#include <lumicor/lmk.h>
 #include "oriel/src/pixdif/pixdif_detector.h"
 
 namespace {
@@ -187,8 +187,9 @@ uint32_t CAinterface::Detect(const MIPlane* plane, const _CAFaceInfoArray* faces
     param.outputPath[sizeof param.outputPath - 1] = '\0';
     if (debugOutput) {
         const char* name = "param.txt";
-        std::FILE* fp = CA::IsDirectory(name) ? nullptr : std::fopen(name, "w");
-        if (fp == nullptr) {
+        // fopen_s refuses a path that names a directory.
+        std::FILE* fp = nullptr;
+        if (lmk::fopen_s(&fp, name, "w") != 0 || fp == nullptr) {
             std::fprintf(stderr, "No write file: %s\n", name);
             return 11;
         }

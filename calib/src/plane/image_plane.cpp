@@ -6,8 +6,8 @@
 #include <cstring>
 #include <new>
 
-#include "calib/src/plane/pnm_writer.h"
 #include "common/src/internal/memory.h"
+#include "common/src/internal/ppm.h"
 
 namespace {
 
@@ -237,9 +237,9 @@ int32_t ImagePlaneT<T>::iSavePGM(const char* path) const {
         const T* row = pConstPixel + static_cast<ptrdiff_t>(y) * stride;
         for (int32_t x = 0; x < width; ++x) packed[static_cast<size_t>(y) * width + x] = ToByte(row[x]);
     }
-    const CA::PnmResult r = CA::WriteDebugPnm(path, 1, width, height, packed.get());
-    if (r == CA::PnmResult::kOpenFailed) std::printf("%s can not open\n", path);
-    return r == CA::PnmResult::kOk ? 0 : IMAGEPLANE_ERR_FILE;
+    const lmk::PnmStatus r = lmk::WritePnm(path, 1, width, height, packed.get());
+    if (r == lmk::PnmStatus::kOpenFailed) std::printf("%s can not open\n", path);
+    return r == lmk::PnmStatus::kOk ? 0 : IMAGEPLANE_ERR_FILE;
 }
 
 template <typename T>
@@ -479,9 +479,9 @@ int32_t MIPlane::iSavePPM(const char* path) const {
             *out++ = p1[x];
         }
     }
-    const CA::PnmResult r = CA::WriteDebugPnm(path, 3, width, height, packed.get());
-    if (r == CA::PnmResult::kOpenFailed) std::printf("%s can not open\n", path);
-    return r == CA::PnmResult::kOk ? 0 : IMAGEPLANE_ERR_FILE;
+    const lmk::PnmStatus r = lmk::WritePnm(path, 3, width, height, packed.get());
+    if (r == lmk::PnmStatus::kOpenFailed) std::printf("%s can not open\n", path);
+    return r == lmk::PnmStatus::kOk ? 0 : IMAGEPLANE_ERR_FILE;
 }
 
 int32_t MIPlane::iDebugDump(const char* path, bool append) const {
@@ -499,10 +499,10 @@ int32_t MIPlane::iDebugDump(const char* path, bool append) const {
 
 namespace {
 int SavePacked(const uint8_t* buffer, int32_t width, int32_t height, const char* path, uint32_t channels) {
-    if (path == nullptr || CA::IsDirectory(path)) return 1;
-    const CA::PnmResult r = CA::WriteDebugPnm(path, channels, width, height, buffer);
-    if (r == CA::PnmResult::kOpenFailed) std::printf("fopen_s() failed\n");
-    return r == CA::PnmResult::kOk ? 0 : 1;
+    // A directory cannot be opened for writing: it fails like any other path.
+    const lmk::PnmStatus r = lmk::WritePnm(path, channels, width, height, buffer);
+    if (r == lmk::PnmStatus::kOpenFailed) std::printf("fopen_s() failed\n");
+    return r == lmk::PnmStatus::kOk ? 0 : 1;
 }
 }  // namespace
 

@@ -24,6 +24,14 @@ UniqueArray<T> NewArray(size_t n) {
     return UniqueArray<T>(new (std::nothrow) T[n]());
 }
 
+// The same without the zeroing, for large buffers that are written in full
+// before they are read.
+template <typename T>
+UniqueArray<T> NewUninitializedArray(size_t n) {
+    if (n == 0) return UniqueArray<T>();
+    return UniqueArray<T>(new (std::nothrow) T[n]);
+}
+
 template <typename T, typename... Args>
 std::unique_ptr<T> NewObject(Args&&... args) {
     return std::unique_ptr<T>(new (std::nothrow) T(std::forward<Args>(args)...));

@@ -47,6 +47,11 @@ const double kExp2Table[64] = {
 namespace {
 const double kLn2HiN = 0x1.62e42fee00000p-7;  // ln 2 / 64, upper part (k * hi is exact)
 const double kLn2LoN = 0x1.a39ef35793c76p-39; // ln 2 / 64 - kLn2HiN
+const double kLn2Hi = 0x1.62e42fee00000p-1;   // ln 2, upper part (e * hi is exact)
+const double kLn2Lo = 0x1.a39ef35793c76p-33;  // ln 2 - kLn2Hi
+// 2 / (2k + 3) for k = 0..12.
+const double kLogSeries[13] = {2.0 / 3,  2.0 / 5,  2.0 / 7,  2.0 / 9,  2.0 / 11, 2.0 / 13, 2.0 / 15,
+                               2.0 / 17, 2.0 / 19, 2.0 / 21, 2.0 / 23, 2.0 / 25, 2.0 / 27};
 }  // namespace
 
 double Exp(double x) {
@@ -75,6 +80,43 @@ double Exp(double x) {
     if (m >= -1022) return y * Pow2(m);
     // Subnormal result: scale in two steps so that no step leaves the normal range early.
     return (y * Pow2(m + 960)) * Pow2(-960);
+}
+
+double Log(double x) {
+    if (x != x || x < 0.0) return std::numeric_limits<double>::quiet_NaN();
+    if (x == 0.0) return -std::numeric_limits<double>::infinity();
+    if (x == std::numeric_limits<double>::infinity()) return x;
+
+    // x = 2^e * m with m in [sqrt(1/2), sqrt(2)).
+    int32_t e = 0;
+    if (x < 0x1p-1022) {
+        x *= 0x1p54;
+        e = -54;
+    }
+    uint64_t bits;
+    std::memcpy(&bits, &x, sizeof bits);
+    e += static_cast<int32_t>((bits >> 52) & 0x7FF) - 1023;
+    bits = (bits & 0x000FFFFFFFFFFFFFull) | 0x3FF0000000000000ull;
+    double m;
+    std::memcpy(&m, &bits, sizeof m);
+    if (m > 1.4142135623730951) {
+        m *= 0.5;
+        ++e;
+    }
+
+    // log(1 + f) = 2 atanh(s) with s = f / (2 + f), |s| <= 0.1716, written as
+    // f - (f^2/2 - s (f^2/2 + R)) with R = sum 2 s^(2k) / (2k + 1): the series
+    // to s^26 leaves a remainder far below half an ulp.
+    const double f = m - 1.0;
+    const double s = f / (2.0 + f);
+    const double z = s * s;
+    double p = kLogSeries[12];
+    for (int k = 11; k >= 0; --k) p = kLogSeries[k] + z * p;
+    const double r = z * p;
+    const double hfsq = 0.5 * f * f;
+    const double logm = f - (hfsq - s * (hfsq + r));
+    const double ed = static_cast<double>(e);
+    return (ed * kLn2Hi + logm) + ed * kLn2Lo;
 }
 
 }  // namespace lmk

@@ -32,6 +32,10 @@ inline double Pow2(int32_t e) {
 // e^x within about 1 ulp; NaN for NaN, +inf above the double range, 0 below it.
 double Exp(double x);
 
+// Natural logarithm within about 1 ulp; NaN for NaN and negative x, -inf
+// for 0, +inf for +inf. Subnormal arguments are scaled into the normal range.
+double Log(double x);
+
 // e^x for float arguments, evaluated in double with a relative error below
 // 4e-11 before the one rounding to float; NaN for NaN, +inf and 0 beyond the
 // float range. Inline: it sits in the innermost loops of the framing search.

@@ -210,6 +210,21 @@ int KtClblParse(const unsigned char* data, unsigned int length, KtFrameHeader* h
 int KtSimlExtract(const unsigned char* pixels, unsigned int width, unsigned int height, int pitch,
                   unsigned int format, _KtMetaSimilarity** out);
 
+/* Computes the representative (quality) meta of a photo into a new record in
+ * *out, which must be NULL on entry: colour variation from siml's palette,
+ * finger on lens (with up to KT_MAX_FINGERS finger outlines in the pixels of
+ * a copy of about 80 x 60), out of focus and camera shake with a blur map
+ * (from a gray copy of about 640 x 480; -1.0 and no map when that copy is
+ * below 24 pixels in either direction), bad exposure, and motion blur 0.
+ * `format`: 0 RGB, 1 BGR (3 bytes), 2 RGBA, 3 BGRA, 4 ARGB (4 bytes); `pitch`
+ * is the signed distance between rows (negative: bottom-up, pixels at the top
+ * row). The pixels are only read. Returns 0; 3 for a format above 4, a zero
+ * size, *out already set or |pitch| < width x bytes per pixel; 2 when pixels,
+ * siml or out is NULL; 4 out of memory; 12 when a score falls outside [0, 1];
+ * image-function codes pass through. */
+int KtRepmExtract(const unsigned char* pixels, unsigned int width, unsigned int height, int pitch,
+                  unsigned int format, const _KtMetaSimilarity* siml, _KtMetaRepresentative** out);
+
 /* Computes the colour labels (pixel-weighted share of white, black, red,
  * yellow, green and blue palette colours, 0..100 %) of a similarity meta into
  * a new record in *out, which must be NULL on entry. A meta without palette

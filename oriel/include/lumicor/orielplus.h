@@ -307,7 +307,7 @@ uint32_t OrielPlus_SetMaxOmpThreads(int32_t threads, OrielHandle handle);
  * sorted by descending score; count 0 and NULL when none). The detector
  * runs at the working pixel count; detections scoring between 0.3 x the
  * threshold and the threshold (the best four) get a second look on a
- * window twice their size at 128 x 128 and are kept, with the box of that
+ * window twice their size at 160 x 160 and are kept, with the box of that
  * look, only when it scores above the threshold. What is filled besides box
  * and score follows the dictionary mode. */
 uint32_t OrielPlus_DetectFace(const uint8_t* pPixels, uint32_t width, uint32_t height, Oriel_InputColorMode mode,

@@ -15,7 +15,7 @@ namespace {
 const size_t kMaxPerCrop = 100;   // detections kept per detector run
 const size_t kMaxDetections = 256;
 const int kLocalInput = 192;      // detector input side of the local search
-const int kVerifyInput = 128;     // detector input side of the second look
+const int kVerifyInput = 160;     // detector input side of the second look
 const size_t kMaxVerify = 4;      // second looks per detection call
 
 float Clamp(float v, float lo, float hi) { return v < lo ? lo : (v > hi ? hi : v); }
