@@ -70,14 +70,6 @@ bool Library::Analyze(const _zbm_Image* rgb, bool detectFaces, std::vector<uint8
         *error = "not an RGB photo";
         return false;
     }
-#ifdef LUMICOR_TOOL_WITHOUT_ANALYSIS
-    // The library of this build has no photo analysis yet; metas made
-    // elsewhere can still be framed, compared and printed.
-    (void)detectFaces;
-    (void)blob;
-    *error = "this build of the library cannot analyse photos yet (no LmcAnalyzePhoto)";
-    return false;
-#else
     const LmcImage image = {rgb->pData, nullptr, rgb->width, rgb->height, rgb->pitch, LMC_PIXEL_ORDER_RGB};
     LmcPhotoMeta meta = {0, nullptr};
     uint32_t status;
@@ -104,7 +96,6 @@ bool Library::Analyze(const _zbm_Image* rgb, bool detectFaces, std::vector<uint8
     blob->assign(meta.pMeta, meta.pMeta + meta.nBufferSize);
     LmcDisposePhotoMeta(&meta);
     return true;
-#endif
 }
 
 }  // namespace lumicor_tool

@@ -168,7 +168,6 @@ TEST_F(LumicorCliTest, FoldersExpandToTheirPhotosInNameOrder) {
               "[###############...............] 5/10 photos, 2.5 photos/s");
 }
 
-#ifndef LUMICOR_TOOL_WITHOUT_ANALYSIS
 TEST_F(LumicorCliTest, AnalyzeWritesMetaJsonAndAnnotatedPicture) {
     TempDir photos;
     // A JPEG stored sideways (EXIF orientation 6) and a PNG.
@@ -216,6 +215,5 @@ TEST_F(LumicorCliTest, AnalyzeWritesMetaJsonAndAnnotatedPicture) {
     EXPECT_EQ(o.exit, 0) << o.err;
     EXPECT_NE(o.out.find("   1    0.0000  " + out + "/flat.lmeta  (near-duplicate)"), std::string::npos) << o.out;
 }
-#endif
 
 }  // namespace
