@@ -100,7 +100,11 @@ TEST_F(LmcAnalyzePhotoTest, RefusalsGiveTheirStatusAndLogLines) {
     const LmcImage order8 = with([](LmcImage& i) { i.order = LMC_PIXEL_ORDER_MAX; });
     const LmcImage noBuffer = with([](LmcImage& i) { i.pBuf = nullptr; });
     const LmcImage noWords = with([](LmcImage& i) { i.order = LMC_PIXEL_ORDER_INT32_ARGB; });
-    const LmcImage orderMinus1 = with([](LmcImage& i) { i.order = static_cast<LmcPixelOrder>(-1); });
+    // -1 is written as the 32-bit field a C host may store (not a C++ enumerator).
+    const LmcImage orderMinus1 = with([](LmcImage& i) {
+        const int32_t minusOne = -1;
+        std::memcpy(&i.order, &minusOne, sizeof minusOne);
+    });
     const LmcImage narrow = with([](LmcImage& i) { i.width = 9; });
     const LmcImage shortPitch = with([](LmcImage& i) { i.pitch = -(64 * 3 - 1); });
     const LmcImage oddWordPitch = {nullptr, words, 16, 16, 16 * 4 + 2, LMC_PIXEL_ORDER_INT32_ARGB};
@@ -150,7 +154,9 @@ TEST_F(LmcAnalyzePhotoTest, RefusalsGiveTheirStatusAndLogLines) {
         if (c.imageFields) {
             EXPECT_NE(log.find("width = " + std::to_string(c.image->width) + "\n"), std::string::npos) << log;
             EXPECT_NE(log.find("pitch = " + std::to_string(c.image->pitch) + "\n"), std::string::npos) << log;
-            EXPECT_NE(log.find("order = " + std::to_string(static_cast<int>(c.image->order)) + "\n"), std::string::npos);
+            int32_t order;
+            std::memcpy(&order, &c.image->order, sizeof order);
+            EXPECT_NE(log.find("order = " + std::to_string(order) + "\n"), std::string::npos) << log;
             EXPECT_NE(log.find("pBufInt32 = 0x"), std::string::npos) << log;
         }
     }

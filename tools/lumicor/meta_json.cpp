@@ -85,10 +85,12 @@ json FaceRegionJson(const _FaceRegion& r, const _VondOrielMetaArray& scores, uin
     face["rotation"] = {{"yaw", Num(rotation[0])}, {"pitch", Num(rotation[1])}, {"roll", Num(rotation[2])}};
     face["auxWord"] = static_cast<uint32_t>(r.auxWord);
     face["auxFlag"] = static_cast<int>(r.auxFlag);
-    face["rightEye"] = Point(zbm_Pos(r.rightEye));
-    face["leftEye"] = Point(zbm_Pos(r.leftEye));
-    face["rightMouthEnd"] = Point(zbm_Pos(r.rightMouthEnd));
-    face["leftMouthEnd"] = Point(zbm_Pos(r.leftMouthEnd));
+    const zbm_Pos rightEye = r.rightEye, leftEye = r.leftEye;
+    const zbm_Pos rightMouthEnd = r.rightMouthEnd, leftMouthEnd = r.leftMouthEnd;
+    face["rightEye"] = Point(rightEye);
+    face["leftEye"] = Point(leftEye);
+    face["rightMouthEnd"] = Point(rightMouthEnd);
+    face["leftMouthEnd"] = Point(leftMouthEnd);
     face["code"] = {{"valid", static_cast<int>(r.codeValid)}, {"flag", static_cast<int>(r.codeFlag)},
                     {"value", static_cast<int>(r.code)}};
     face["orientation"] = static_cast<int>(r.orientation);
@@ -261,10 +263,14 @@ nlohmann::ordered_json MetaToJson(const _VondMeta& meta) {
 }
 
 FaceView ViewFace(const _FaceRegion& r) {
+    // Copy-initialised from the packed record (an assignment would bind a
+    // reference to a misaligned member).
+    const zbm_Rect box = r.faceArea;
+    const zbm_Pos rightEye = r.rightEye, leftEye = r.leftEye;
     FaceView v;
-    v.box = r.faceArea;
-    v.rightEye = r.rightEye;
-    v.leftEye = r.leftEye;
+    v.box = box;
+    v.rightEye = rightEye;
+    v.leftEye = leftEye;
     v.ageMin = r.ageMin;
     v.ageMax = r.ageMax;
     v.smile = -1;

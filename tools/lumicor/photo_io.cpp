@@ -103,9 +103,11 @@ struct JpegOutput {
     int orientation = 1;
 };
 
-// Kept free of objects with destructors between setjmp and the calls that
-// may jump: the output lives in the caller's frame.
-bool DecodeJpegRaw(const std::vector<uint8_t>& bytes, JpegOutput* out, std::string* error) {
+enum class JpegStatus { kOk, kCorrupt, kTooLarge, kTruncated };
+
+// Kept free of local objects between setjmp and the calls that may jump:
+// the output lives in the caller's frame and the message in a plain buffer.
+JpegStatus DecodeJpegRaw(const std::vector<uint8_t>& bytes, JpegOutput* out, char* message) {
     jpeg_decompress_struct cinfo;
     JpegError err;
     err.truncated = false;
@@ -115,8 +117,8 @@ bool DecodeJpegRaw(const std::vector<uint8_t>& bytes, JpegOutput* out, std::stri
     err.mgr.emit_message = JpegEmitMessage;
     if (setjmp(err.jump) != 0) {
         jpeg_destroy_decompress(&cinfo);
-        *error = std::string("corrupt or unsupported JPEG data (") + err.message + ")";
-        return false;
+        std::memcpy(message, err.message, JMSG_LENGTH_MAX);
+        return JpegStatus::kCorrupt;
     }
     jpeg_create_decompress(&cinfo);
     jpeg_mem_src(&cinfo, bytes.data(), static_cast<unsigned long>(bytes.size()));
@@ -133,8 +135,7 @@ bool DecodeJpegRaw(const std::vector<uint8_t>& bytes, JpegOutput* out, std::stri
     const uint64_t bytesTotal = static_cast<uint64_t>(cinfo.output_width) * cinfo.output_height * 3;
     if (cinfo.output_components != 3 || bytesTotal > (uint64_t{1} << 31)) {
         jpeg_destroy_decompress(&cinfo);
-        *error = "JPEG photo too large";
-        return false;
+        return JpegStatus::kTooLarge;
     }
     out->width = static_cast<int>(cinfo.output_width);
     out->height = static_cast<int>(cinfo.output_height);
@@ -145,12 +146,11 @@ bool DecodeJpegRaw(const std::vector<uint8_t>& bytes, JpegOutput* out, std::stri
     }
     if (err.truncated) {
         jpeg_destroy_decompress(&cinfo);
-        *error = "truncated JPEG data";
-        return false;
+        return JpegStatus::kTruncated;
     }
     jpeg_finish_decompress(&cinfo);
     jpeg_destroy_decompress(&cinfo);
-    return true;
+    return JpegStatus::kOk;
 }
 
 // An owning RGB image holding the packed rows of `pixels`.
@@ -166,7 +166,20 @@ bool ToImage(const std::vector<uint8_t>& pixels, int width, int height, ZbmImage
 
 bool DecodeJpeg(const std::vector<uint8_t>& bytes, Photo* photo, std::string* error) {
     JpegOutput out;
-    if (!DecodeJpegRaw(bytes, &out, error)) return false;
+    char message[JMSG_LENGTH_MAX] = {0};
+    switch (DecodeJpegRaw(bytes, &out, message)) {
+        case JpegStatus::kOk:
+            break;
+        case JpegStatus::kCorrupt:
+            *error = std::string("corrupt or unsupported JPEG data (") + message + ")";
+            return false;
+        case JpegStatus::kTooLarge:
+            *error = "JPEG photo too large";
+            return false;
+        case JpegStatus::kTruncated:
+            *error = "truncated JPEG data";
+            return false;
+    }
     if (!ToImage(out.pixels, out.width, out.height, &photo->image, error)) return false;
     photo->exifOrientation = out.orientation;
     if (out.orientation != 1) {

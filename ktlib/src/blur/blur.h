@@ -160,7 +160,7 @@ private:
     // Transform1D down every column of the top-left w x h region, kStrip
     // columns at a time; scratch holds kStrip x h values.
     void TransformColumns(int32_t w, int32_t h, double* scratch);
-    static const int32_t kStrip = 16;
+    static constexpr int32_t kStrip = 16;
 
     static const int32_t kMaxLevels = 32;
     int32_t width_;

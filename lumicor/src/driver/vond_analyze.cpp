@@ -29,8 +29,7 @@ int32_t HostBytesPerPixel(int32_t order) { return order == 0 ? 1 : (order <= 2 ?
 // The photo as an RGB image: `rgb` is either an owning image or a record
 // attached to the host's RGB buffer (never its pixels). Returns the result
 // of the step.
-_VondResult MakeRgb(_VondResult result, const _zbm_Image& host, ZbmImagePtr* rgb) {
-    const int32_t order = static_cast<int32_t>(host.order);
+_VondResult MakeRgb(_VondResult result, const _zbm_Image& host, int32_t order, ZbmImagePtr* rgb) {
     if (order == vond::kHostOrderInt32Argb) {
         if (host.pitch % 4 != 0) return vond::Fail(result, VOND_STATUS_INVALID_PARAMETER, "invalid pitch for INT32_ARGB");
         rgb->reset(ZbiuCreate(host.width, host.height, ZBM_PIXEL_ORDER_RGB));
@@ -90,7 +89,10 @@ _VondResult VondAnalyze(const _zbm_Image* pImage, int32_t faceRectCount, const _
                           "pImage == NULL || pImage->pBuf == NULL || pImage->width == 0 || pImage->height == 0 || "
                           "pImage->pitch == 0");
     }
-    const int32_t order = static_cast<int32_t>(pImage->order);
+    // Host numbering in a 32-bit field that may hold any value (also outside
+    // the enumeration), so it is read as an integer.
+    int32_t order;
+    std::memcpy(&order, &pImage->order, sizeof order);
     if (order >= vond::kHostOrderCount) {
         return vond::Fail(result, VOND_STATUS_INVALID_PARAMETER,
                           "pImage == NULL || pImage->pBuf == NULL || pImage->width == 0 || pImage->height == 0 || "
@@ -119,7 +121,7 @@ _VondResult VondAnalyze(const _zbm_Image* pImage, int32_t faceRectCount, const _
     }
 
     ZbmImagePtr rgb;
-    _VondResult step = MakeRgb(result, *pImage, &rgb);
+    _VondResult step = MakeRgb(result, *pImage, order, &rgb);
     if (step.status != VOND_STATUS_OK) return step;
     ZbmImagePtr resized;
     step = MakeWorking(result, rgb.get(), &resized);

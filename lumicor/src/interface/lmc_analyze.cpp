@@ -43,8 +43,12 @@ extern "C" uint32_t LmcAnalyzePhoto(const LmcImage* pImage, int32_t nFaceRectCou
     pMetaOut->nBufferSize = 0;
     pMetaOut->pMeta = nullptr;
 
+    // The order is a 32-bit signed field that a host may fill with any value;
+    // it is read as such, since a C++ enumeration cannot hold all of them.
+    int32_t order = 0;
+    if (pImage != nullptr) std::memcpy(&order, &pImage->order, sizeof order);
     if (pImage == nullptr || pImage->width <= 0 || pImage->height <= 0 || pImage->pitch == 0 ||
-        static_cast<int32_t>(pImage->order) >= LMC_PIXEL_ORDER_MAX) {
+        order >= LMC_PIXEL_ORDER_MAX) {
         LMC_LOG_ERROR(
             "%s(%d): LmcAnalyzePhoto(): pImage == NULL || pImage->width <= 0 || pImage->height <= 0 || "
             "pImage->pitch == 0 || pImage->order >= LMC_PIXEL_ORDER_MAX\n");
@@ -54,7 +58,8 @@ extern "C" uint32_t LmcAnalyzePhoto(const LmcImage* pImage, int32_t nFaceRectCou
         LMC_LOG_ERROR("%s(%d): LmcAnalyzePhoto(): nFaceRectCount < -1 || nFaceRectCount >= 1 && pFaceRectArray == NULL\n");
         return LMC_STATUS_INVALID_PARAMETER;
     }
-    const bool int32Order = pImage->order == LMC_PIXEL_ORDER_INT32_ARGB;
+    static_assert(sizeof(LmcPixelOrder) == sizeof(int32_t), "the order is a 32-bit field");
+    const bool int32Order = order == LMC_PIXEL_ORDER_INT32_ARGB;
     if (!int32Order && pImage->pBuf == nullptr) {
         LMC_LOG_ERROR("%s(%d): LmcAnalyzePhoto(): pImage->order != LMC_PIXEL_ORDER_INT32_ARGB && pImage->pBuf == NULL\n");
         return LMC_STATUS_INVALID_PARAMETER;
@@ -76,7 +81,7 @@ extern "C" uint32_t LmcAnalyzePhoto(const LmcImage* pImage, int32_t nFaceRectCou
     wrapper.width = pImage->width;
     wrapper.height = pImage->height;
     wrapper.pitch = pImage->pitch;
-    wrapper.order = static_cast<_zbm_PixelOrder>(pImage->order);
+    std::memcpy(&wrapper.order, &order, sizeof order);  // the driver reads it the same way
 
     lmk::UniqueArray<_VondFaceRect> rects;
     if (nFaceRectCount >= 1) {
@@ -104,7 +109,7 @@ extern "C" uint32_t LmcAnalyzePhoto(const LmcImage* pImage, int32_t nFaceRectCou
             LMC_LOG_ERROR("%s(%d): width = %d\n", pImage->width);
             LMC_LOG_ERROR("%s(%d): height = %d\n", pImage->height);
             LMC_LOG_ERROR("%s(%d): pitch = %d\n", pImage->pitch);
-            LMC_LOG_ERROR("%s(%d): order = %d\n", static_cast<int>(pImage->order));
+            LMC_LOG_ERROR("%s(%d): order = %d\n", static_cast<int>(order));
         }
     } else {
         const uint32_t debug = outputPpmImagesForDebug(pImage, &meta);
