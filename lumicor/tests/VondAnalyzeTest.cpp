@@ -2,6 +2,8 @@
 // reach, the working-image size and the attention engine's size limit.
 #include <lumicor/vond.h>
 
+#include "testkit/images.h"
+
 #include <gtest/gtest.h>
 
 #include <cstring>
@@ -9,26 +11,6 @@
 #include <vector>
 
 namespace {
-
-// A picture with a few bright discs on a textured ground.
-std::vector<uint8_t> Discs(int w, int h) {
-    std::vector<uint8_t> rgb(static_cast<size_t>(w) * h * 3);
-    for (int y = 0; y < h; ++y)
-        for (int x = 0; x < w; ++x) {
-            uint8_t* p = &rgb[(static_cast<size_t>(y) * w + x) * 3];
-            p[0] = static_cast<uint8_t>(60 + (x * 7 + y * 3) % 23);
-            p[1] = static_cast<uint8_t>(70 + (x * 5 + y * 11) % 19);
-            p[2] = static_cast<uint8_t>(90);
-            const int cx[3] = {w / 4, w / 2, 3 * w / 4}, cy[3] = {h / 3, 2 * h / 3, h / 4}, r[3] = {h / 6, h / 9, h / 12};
-            for (int i = 0; i < 3; ++i)
-                if ((x - cx[i]) * (x - cx[i]) + (y - cy[i]) * (y - cy[i]) < r[i] * r[i]) {
-                    p[0] = static_cast<uint8_t>(250 - 40 * i);
-                    p[1] = static_cast<uint8_t>(200 + 20 * i);
-                    p[2] = static_cast<uint8_t>(30 * i);
-                }
-        }
-    return rgb;
-}
 
 _zbm_Image Host(std::vector<uint8_t>& pixels, int w, int h, int pitch, int order) {
     _zbm_Image image;
@@ -145,8 +127,11 @@ TEST(VondAnalyzeTest, WorkingImageSize) {
 
 TEST(VondAnalyzeTest, PanoramaTooLowForAttentionAreas) {
     // 2000 x 200 is analysed at 1752 x 175: lower than the attention engine's 240.
-    std::vector<uint8_t> pixels = Discs(2000, 200);
-    const _zbm_Image image = Host(pixels, 2000, 200, 2000 * 3, 1);
+    ZbmImagePtr noise = lumicor::test::MakeNoiseImage(2000, 200, ZBM_PIXEL_ORDER_RGB);
+    ASSERT_TRUE(noise);
+    _zbm_Image image = *noise;  // the same pixels, described as the host's RGB (order 1)
+    image.order = static_cast<_zbm_PixelOrder>(1);
+    image.ownsData = 0;
     Meta meta;
     const _VondResult r = VondAnalyze(&image, 0, nullptr, nullptr, &meta.m);
     ASSERT_EQ(r.status, VOND_STATUS_OK) << r.message;
