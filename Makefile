@@ -7,7 +7,7 @@ PRESETS      ?= default asan armhf fuzz
 FUZZ_SECONDS ?= 300
 DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenchmark-dev \
                 clang-14 libclang-rt-14-dev crossbuild-essential-armhf qemu-user libjpeg-dev \
-                nodejs
+                libpng-dev libexif-dev libcli11-dev nlohmann-json3-dev nodejs
 
 # Training the finger-on-lens patch dictionaries (tools/train/README.md);
 # npm comes with the machine's Node.js.
@@ -45,8 +45,22 @@ test-%: FORCE
 
 FORCE:
 
-demo: build
-	./build/default/tools/lumicor_demo/lumicor_demo
+# The main job: the sample photos analysed with the lumicor tool (blob, JSON,
+# annotated picture), each framed at 1:1 and 16:9.
+DEMO_DIR = build/demo
+demo: build sample-photos
+	@photos=$(PHOTO_CACHE)/package/demo; tool=./build/default/tools/lumicor/lumicor; \
+	if ! ls $$photos/*.jpg >/dev/null 2>&1; then echo "no sample photos in $$photos (see make sample-photos)"; exit 1; fi; \
+	if [ ! -x $$tool ]; then echo "$$tool was not built (missing Debian packages? see make deps)"; exit 1; fi; \
+	$$tool analyze $$photos -o $(DEMO_DIR) --annotate -j 2 || exit 1; \
+	for p in $$photos/*.jpg; do \
+	  n=$$(basename $$p .jpg); \
+	  for a in 1:1 16:9; do \
+	    $$tool frame $(DEMO_DIR)/$$n.lmeta --aspect $$a --photo $$p -o $(DEMO_DIR)/$$n.crop-$$(echo $$a | tr : x).png || exit 1; \
+	  done; \
+	done; \
+	echo; echo "outputs in $(DEMO_DIR)/: NAME.lmeta (photo meta), NAME.json (readable meta),"; \
+	echo "  NAME.annotated.png (faces, attention areas, fingers), NAME.crop-1x1.png, NAME.crop-16x9.png"
 
 fuzz: deps
 	cmake --preset fuzz
@@ -83,7 +97,7 @@ train-fervl: build sample-photos
 install: build
 	cmake --install build/default
 
-# Sample photos for the similarity quality check (tools/siml_rank): the demo
+# Sample photos for `make demo` and the similarity quality check (tools/siml_rank): the demo
 # JPEGs of an npm package, kept under build/cache. Best effort: without them
 # the check is skipped.
 PHOTO_PACKAGE = @vladmandic/face-api@1.7.15

@@ -20,18 +20,13 @@ namespace {
 
 using lumicor::test::TempDir;
 
-// A serialised blob of a meta built by `build`.
+// A serialised blob of a meta built by `build`, analysed at width x height.
 std::vector<uint8_t> Blob(bool (*build)(_VondMeta*), uint16_t width = 640, uint16_t height = 480) {
     _VondMeta meta;
     if (!build(&meta)) return {};
     meta.analyzedWidth = width;
     meta.analyzedHeight = height;
-    uint32_t size = 0;
-    std::vector<uint8_t> bytes;
-    if (VondGetSerializedSize(&meta, &size).status == VOND_STATUS_OK) {
-        bytes.resize(size);
-        if (VondSerializeMeta(&meta, size, bytes.data()).status != VOND_STATUS_OK) bytes.clear();
-    }
+    std::vector<uint8_t> bytes = lumicor::test::SerializeToBlob(meta);
     VondDisposeMeta(&meta);
     return bytes;
 }

@@ -1,5 +1,8 @@
-// Attention section of the photo meta: layout, round trip, refusals, dump.
+// Attention section of the photo meta: the areas of an analysed photo, and
+// the section's layout, round trip, refusals and dump.
 #include <lumicor/vond.h>
+
+#include "testkit/fault.h"
 
 #include <gtest/gtest.h>
 
@@ -176,6 +179,121 @@ TEST(VondCALibMetaTest, DumpPrintsEveryArea) {
               "\t nx = 0.250000\n\t ny = 0.500000\n\t nw = 0.125000\n\t nh = 0.750000\n\t direction = -1\n"
               "\n*** VondCALibDump() ***\nisFace = false\nnumAreas = 1\n"
               "\t nx = 0.000000\n\t ny = 1.000000\n\t nw = 0.500000\n\t nh = 0.500000\n\t saliency = 200\n");
+}
+
+// A picture with three bright discs of different sizes on a textured ground.
+ZbmImagePtr Discs(int w, int h) {
+    ZbmImagePtr image(ZbiuCreate(w, h, ZBM_PIXEL_ORDER_RGB));
+    if (!image) return image;
+    for (int y = 0; y < h; ++y)
+        for (int x = 0; x < w; ++x) {
+            uint8_t* p = ZbiuGetPointer(image.get(), x, y);
+            p[0] = static_cast<uint8_t>(60 + (x * 7 + y * 3) % 23);
+            p[1] = static_cast<uint8_t>(70 + (x * 5 + y * 11) % 19);
+            p[2] = 90;
+            const int cx[3] = {w / 4, w / 2, 3 * w / 4}, cy[3] = {h / 3, 2 * h / 3, h / 4}, r[3] = {h / 6, h / 9, h / 12};
+            for (int i = 0; i < 3; ++i)
+                if ((x - cx[i]) * (x - cx[i]) + (y - cy[i]) * (y - cy[i]) < r[i] * r[i]) {
+                    p[0] = static_cast<uint8_t>(250 - 40 * i);
+                    p[1] = static_cast<uint8_t>(200 + 20 * i);
+                    p[2] = static_cast<uint8_t>(30 * i);
+                }
+        }
+    return image;
+}
+
+struct AnalyzeOutput {
+    _CAAttentionAreaArray areas;
+    _CALibVersion version;
+    AnalyzeOutput() {
+        std::memset(&areas, 0, sizeof areas);
+        std::memset(&version, 0, sizeof version);
+    }
+    ~AnalyzeOutput() { VondCALibDisposeMeta(areas); }
+};
+
+TEST(VondCALibMetaTest, AnalyzeRefusesOtherThanRgbAndSkipsSmallImages) {
+    _FaceMeta noFaces{};
+    ZbmImagePtr bgr(ZbiuCreate(320, 240, ZBM_PIXEL_ORDER_BGR));
+    AnalyzeOutput out;
+    _VondResult r = VondCALibAnalyze(bgr.get(), noFaces, out.areas, out.version);
+    EXPECT_EQ(r.status, VOND_STATUS_INVALID_PARAMETER);
+    EXPECT_STREQ(r.function, "VondCALibAnalyze");
+    EXPECT_STREQ(r.message, "invalid pImage->order");
+    EXPECT_STREQ(out.version.text, "1.2.2.1217");  // recorded before the checks
+
+    // Below 240 pixels a side there are no areas, and that is not a failure.
+    const zbm_Pos sizes[2] = {{239, 320}, {320, 239}};
+    for (const zbm_Pos& size : sizes) {
+        ZbmImagePtr small(ZbiuCreate(size.x, size.y, ZBM_PIXEL_ORDER_RGB));
+        AnalyzeOutput skipped;
+        r = VondCALibAnalyze(small.get(), noFaces, skipped.areas, skipped.version);
+        EXPECT_EQ(r.status, VOND_STATUS_OK);
+        EXPECT_STREQ(r.message, "analyze process is skipped since image size is too small");
+        EXPECT_EQ(skipped.areas.numAreas, 0u);
+        EXPECT_STREQ(skipped.version.text, "1.2.2.1217");
+    }
+}
+
+TEST(VondCALibMetaTest, AnalyzeKeepsSalientAreasLargestFirstOrTheFaces) {
+    ZbmImagePtr picture = Discs(640, 480);
+    ASSERT_TRUE(picture);
+    _FaceMeta faces{};
+    AnalyzeOutput salient;
+    _VondResult r = VondCALibAnalyze(picture.get(), faces, salient.areas, salient.version);
+    ASSERT_EQ(r.status, VOND_STATUS_OK) << r.message;
+    EXPECT_EQ(r.message, nullptr);
+    EXPECT_EQ(salient.areas.isFace, 0u);
+    ASSERT_GE(salient.areas.numAreas, 2u);
+    EXPECT_LE(salient.areas.numAreas, 32u);
+    for (uint32_t i = 1; i < salient.areas.numAreas; ++i) {
+        const CAAttentionArea& a = salient.areas.pAreaArray[i - 1];
+        const CAAttentionArea& b = salient.areas.pAreaArray[i];
+        EXPECT_GE(a.nw * a.nh, b.nw * b.nh) << i;
+    }
+
+    // One face, in the pixels of a 1280 x 960 photo: it becomes the one area.
+    _FaceRegion region{};
+    region.faceArea = zbm_Rect{320, 240, 160, 200};
+    const float rotation[3] = {0.0f, 0.0f, 0.0f};
+    std::memcpy(reinterpret_cast<uint8_t*>(&region) + offsetof(_FaceRegion, rotation), rotation, sizeof rotation);
+    faces.imageWidth = 1280;
+    faces.imageHeight = 960;
+    faces.faceNum = 1;
+    faces.regionCount = 1;
+    faces.pRegions = &region;
+    AnalyzeOutput face;
+    r = VondCALibAnalyze(picture.get(), faces, face.areas, face.version);
+    ASSERT_EQ(r.status, VOND_STATUS_OK) << r.message;
+    EXPECT_EQ(face.areas.isFace, 1u);
+    ASSERT_EQ(face.areas.numAreas, 1u);
+    EXPECT_NEAR(face.areas.pAreaArray[0].nx, 0.25f, 0.05f);
+    EXPECT_NEAR(face.areas.pAreaArray[0].ny, 0.25f, 0.05f);
+}
+
+TEST(VondCALibMetaTest, AnalyzeAllocationFailuresLeaveNoAreas) {
+    ZbmImagePtr picture = Discs(320, 240);
+    ASSERT_TRUE(picture);
+    _FaceMeta faces{};
+    _VondResult r{};
+    AnalyzeOutput out;
+    testing::internal::CaptureStderr();  // the attention library's diagnostics
+    const long allocations = lumicor::test::ForEachAllocationFailure(
+        [&] {
+            VondCALibDisposeMeta(out.areas);
+            r = VondCALibAnalyze(picture.get(), faces, out.areas, out.version);
+        },
+        [&](long n, bool triggered) {
+            if (!triggered) {
+                EXPECT_EQ(r.status, VOND_STATUS_OK) << n;
+                return;
+            }
+            EXPECT_TRUE(r.status == VOND_STATUS_OUT_OF_MEMORY || r.status == VOND_STATUS_FAILED) << n;
+            EXPECT_EQ(out.areas.numAreas, 0u) << n;
+            EXPECT_EQ(out.areas.pAreaArray, nullptr) << n;
+        });
+    testing::internal::GetCapturedStderr();
+    EXPECT_GT(allocations, 1);
 }
 
 }  // namespace

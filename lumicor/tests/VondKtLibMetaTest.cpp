@@ -196,3 +196,80 @@ TEST(VondKtLibMetaTest, DumpPrintsTheThreeMetasInOrder) {
                                  Printed([&](FILE* f) { KtClblDump(&q.colorLabel, f); });
     EXPECT_EQ(out, expected);
 }
+
+namespace {
+
+// The quality records of one analysis, released with the test.
+struct KtAnalysis {
+    _VondMeta m;
+    KtAnalysis() { std::memset(&m, 0, sizeof m); }
+    ~KtAnalysis() { VondDisposeMeta(&m); }
+    _VondResult Run(const _zbm_Image* image) {
+        return VondKtLibAnalyze(image, m.simlEngineVersion, m.simlMetaVersion, m.similarity, m.repmEngineVersion,
+                                m.repmMetaVersion, m.representative, m.clblEngineVersion, m.clblMetaVersion,
+                                m.colorLabel);
+    }
+};
+
+ZbmImagePtr Gradient(int w, int h, _zbm_PixelOrder order) {
+    ZbmImagePtr image(ZbiuCreate(w, h, order));
+    for (int y = 0; image && y < h; ++y)
+        for (int x = 0; x < w; ++x) {
+            uint8_t* p = ZbiuGetPointer(image.get(), x, y);
+            p[0] = static_cast<uint8_t>(x * 255 / w);
+            p[1] = static_cast<uint8_t>(y * 255 / h);
+            p[2] = static_cast<uint8_t>((x ^ y) & 0xFF);
+        }
+    return image;
+}
+
+}  // namespace
+
+TEST(VondKtLibMetaTest, AnalyzeOnTheWorkingImageAndItsSmallCopy) {
+    ZbmImagePtr bgr = Gradient(320, 240, ZBM_PIXEL_ORDER_BGR);
+    KtAnalysis refused;
+    _VondResult r = refused.Run(bgr.get());
+    EXPECT_EQ(r.status, VOND_STATUS_INVALID_PARAMETER);
+    EXPECT_STREQ(r.function, "VondKtLibAnalyze");
+    EXPECT_STREQ(r.message, "invalid pImage->order");
+
+    // A 640 x 480 working image: the similarity is made from 160 x 120, the
+    // quality from the whole image, the colour labels from the similarity.
+    ZbmImagePtr rgb = Gradient(640, 480, ZBM_PIXEL_ORDER_RGB);
+    KtAnalysis a;
+    r = a.Run(rgb.get());
+    ASSERT_EQ(r.status, VOND_STATUS_OK) << r.message;
+    EXPECT_EQ(a.m.similarity.width, 160);
+    EXPECT_EQ(a.m.similarity.height, 120);
+    EXPECT_EQ(a.m.simlMetaVersion.major, 2);
+    EXPECT_EQ(a.m.repmMetaVersion.major, 2);
+    EXPECT_EQ(a.m.clblMetaVersion.major, 1);
+    EXPECT_GE(a.m.representative.colorVariation, 0.0f);
+    _KtMetaColorLabel* labels = nullptr;
+    ASSERT_EQ(KtClblExtract(&a.m.similarity, &labels), KT_OK);
+    EXPECT_EQ(std::memcmp(labels, &a.m.colorLabel, sizeof *labels), 0);
+    KtClblDisposeMeta(&labels);
+    // The records are the glue's own copies: the section can be written.
+    EXPECT_GT(VondKtLibGetSerializedSize(a.m.similarity, a.m.representative, a.m.colorLabel), 676u + 32u);
+}
+
+TEST(VondKtLibMetaTest, AnalyzeAllocationFailuresLeaveNothing) {
+    ZbmImagePtr rgb = Gradient(320, 240, ZBM_PIXEL_ORDER_RGB);
+    KtAnalysis a;
+    _VondResult r{};
+    const long allocations = lumicor::test::ForEachAllocationFailure(
+        [&] {
+            VondDisposeMeta(&a.m);
+            r = a.Run(rgb.get());
+        },
+        [&](long n, bool triggered) {
+            if (!triggered) {
+                EXPECT_EQ(r.status, VOND_STATUS_OK) << n;
+                return;
+            }
+            EXPECT_TRUE(r.status == VOND_STATUS_OUT_OF_MEMORY || r.status == VOND_STATUS_FAILED) << n;
+            EXPECT_EQ(a.m.representative.pFingers, nullptr) << n;
+            EXPECT_EQ(a.m.representative.pBlurMap, nullptr) << n;
+        });
+    EXPECT_GT(allocations, 3);
+}

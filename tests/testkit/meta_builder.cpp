@@ -311,5 +311,22 @@ bool IsZeroMeta(const _VondMeta& meta) {
     return true;
 }
 
+std::vector<uint8_t> SerializeToBlob(const _VondMeta& meta) {
+    uint32_t size = 0;
+    std::vector<uint8_t> bytes;
+    if (VondGetSerializedSize(&meta, &size).status != VOND_STATUS_OK) return bytes;
+    bytes.resize(size);
+    if (VondSerializeMeta(&meta, size, bytes.data()).status != VOND_STATUS_OK) bytes.clear();
+    return bytes;
+}
+
+std::vector<uint8_t> BuildBlob(bool (*build)(_VondMeta*)) {
+    _VondMeta meta;
+    if (!build(&meta)) return {};
+    std::vector<uint8_t> bytes = SerializeToBlob(meta);
+    VondDisposeMeta(&meta);
+    return bytes;
+}
+
 }  // namespace test
 }  // namespace lumicor

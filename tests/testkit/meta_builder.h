@@ -14,7 +14,9 @@
 
 #include <lumicor/vond.h>
 
+#include <cstdint>
 #include <string>
+#include <vector>
 
 namespace lumicor {
 namespace test {
@@ -38,6 +40,13 @@ bool BuildEmptyMeta(_VondMeta* meta);
 // Replaces the attention areas of *meta with `count` face areas whose
 // directions are `directions[i]` (isFace set). False when out of memory.
 bool SetFaceAreas(_VondMeta* meta, uint32_t count, const int32_t* directions);
+
+// The blob of a meta (VondGetSerializedSize + VondSerializeMeta); empty when
+// either fails.
+std::vector<uint8_t> SerializeToBlob(const _VondMeta& meta);
+
+// The blob of the meta made by `build` (one of the builders above), or empty.
+std::vector<uint8_t> BuildBlob(bool (*build)(_VondMeta*));
 
 // Compares every field and every owned array. On a difference returns false
 // and, when `why` is given, names the first field that differs.

@@ -107,11 +107,15 @@ uint32_t LmcInitializeLumicor(const char* configPath);
 
 /* Analyses one photo into a new photo meta blob.
  * nFaceRectCount: -1 detects faces automatically, 0 analyses without faces,
- * n >= 1 uses the n boxes of pFaceRectArray (copied; not kept). The host's
- * pixels are read, never written. On success *pMetaOut receives a blob owned
- * by the host; on every failure *pMetaOut is {0, NULL} (when pMetaOut is not NULL).
- * Returns 0; 1 for an invalid argument; 2 out of memory; 7 when the library is
- * not initialised (pMetaOut untouched), or the analysis or debug output failed. */
+ * n >= 1 uses the n boxes of pFaceRectArray (copied; not kept; for -1 and 0
+ * the array is not looked at). The host's pixels are read, never written; an
+ * RGB buffer is used in place. On success *pMetaOut receives a blob owned by
+ * the host; on every failure *pMetaOut is {0, NULL} (when pMetaOut is not NULL).
+ * Every analysed photo advances the debug image counter of lmc.conf's [Debug]
+ * output. Returns 0; 1 for an invalid argument; 2 out of memory; 7 when the
+ * library is not initialised (pMetaOut untouched), the photo is refused by the
+ * analysis (too small, a row longer than the pitch, ...), or the analysis or
+ * debug output failed. */
 uint32_t LmcAnalyzePhoto(const LmcImage* pImage, int32_t nFaceRectCount, const LmcFaceRect* pFaceRectArray,
                          LmcPhotoMeta* pMetaOut);
 

@@ -10,6 +10,7 @@
 #include "common/src/internal/byte_cursor.h"
 #include "common/src/internal/memory.h"
 
+#include <cstddef>
 #include <cstdio>
 #include <cstring>
 #include <new>
@@ -20,6 +21,10 @@ constexpr uint32_t kFixedSize = 22;  // version + isFace + count + width + heigh
 constexpr uint32_t kAreaSize = 17;   // four floats and the value byte
 // The count travels in one byte.
 constexpr uint32_t kMaxAreas = 255;
+// Areas an analysis keeps (the largest), and the smallest working image the
+// attention engine is run on.
+constexpr uint32_t kMaxKeptAreas = 32;
+constexpr int32_t kMinAnalyzedSide = 240;
 
 // Section size for `numAreas` areas; false when it does not fit in 32 bits.
 bool SectionSize(uint32_t numAreas, uint32_t* size) {
@@ -28,6 +33,81 @@ bool SectionSize(uint32_t numAreas, uint32_t* size) {
 }
 
 }  // namespace
+
+_VondResult VondCALibAnalyze(const _zbm_Image* pImage, const _FaceMeta& faceMeta, _CAAttentionAreaArray& areas,
+                             _CALibVersion& version) {
+    _VondResult result = vond::Begin("VondCALibAnalyze");
+    std::memset(&areas, 0, sizeof areas);
+    // The version is recorded also when the areas are skipped or fail.
+    version = CAGetLibVersion();
+    if (pImage == nullptr || pImage->order != ZBM_PIXEL_ORDER_RGB)
+        return vond::Fail(result, VOND_STATUS_INVALID_PARAMETER, "invalid pImage->order");
+    if (pImage->width < kMinAnalyzedSide || pImage->height < kMinAnalyzedSide) {
+        // Not a failure: the photo simply has no attention areas.
+        result.message = "analyze process is skipped since image size is too small";
+        return result;
+    }
+
+    // The faces found earlier, as fractions of the photo with the engine's
+    // roll, pitch and yaw (the region stores them in reverse order).
+    const uint32_t faceCount = faceMeta.regionCount;
+    const _FaceRegion* regions = faceMeta.pRegions;
+    const float imageWidth = static_cast<float>(faceMeta.imageWidth);
+    const float imageHeight = static_cast<float>(faceMeta.imageHeight);
+    lmk::UniqueArray<CAFaceInfo> faces;
+    if (faceCount != 0 && regions != nullptr) {
+        faces = lmk::NewArray<CAFaceInfo>(faceCount);
+        if (!faces) return vond::Fail(result, VOND_STATUS_OUT_OF_MEMORY, "VOND_NEW failed");
+        for (uint32_t i = 0; i < faceCount; ++i) {
+            const _FaceRegion& region = regions[i];
+            const zbm_Rect box = region.faceArea;  // packed: copied, not referenced
+            float rotation[3];                     // yaw, pitch, roll
+            std::memcpy(rotation, reinterpret_cast<const uint8_t*>(&region) + offsetof(_FaceRegion, rotation),
+                        sizeof rotation);
+            CAFaceInfo& face = faces[i];
+            face.nx = static_cast<float>(box.x) / imageWidth;
+            face.ny = static_cast<float>(box.y) / imageHeight;
+            face.nw = static_cast<float>(box.width) / imageWidth;
+            face.nh = static_cast<float>(box.height) / imageHeight;
+            face.roll = rotation[2];
+            face.pitch = rotation[1];
+            face.yaw = rotation[0];
+        }
+    }
+    const _CAFaceInfoArray faceList = {faces ? static_cast<int32_t>(faceCount) : 0, faces.get()};
+
+    _CAAttentionAreaArray found;
+    std::memset(&found, 0, sizeof found);
+    // The library's array is released on every path.
+    auto releaseFound = lmk::MakeScopeGuard([&found] { CADisposeAttentionAreaArray(&found); });
+    if (CADetectSubject(pImage->pData, static_cast<uint32_t>(pImage->width), static_cast<uint32_t>(pImage->height),
+                        pImage->pitch, CA_COLOR_ORDER_RGB, &faceList, &found) != 0 ||
+        (found.numAreas != 0 && found.pAreaArray == nullptr)) {
+        return vond::Fail(result, VOND_STATUS_FAILED, "CADetectSubject failed");
+    }
+
+    // Largest areas first; areas of equal size keep their order. An insertion
+    // sort: the list is short, and it needs no memory that could run out.
+    CAAttentionArea* list = found.pAreaArray;
+    for (uint32_t i = 1; i < found.numAreas; ++i) {
+        const CAAttentionArea area = list[i];
+        const float size = area.nw * area.nh;
+        uint32_t j = i;
+        for (; j > 0 && list[j - 1].nw * list[j - 1].nh < size; --j) list[j] = list[j - 1];
+        list[j] = area;
+    }
+    const uint32_t kept = found.numAreas < kMaxKeptAreas ? found.numAreas : kMaxKeptAreas;
+    if (kept != 0) {
+        CAAttentionArea* records = new (std::nothrow) CAAttentionArea[kept];
+        if (records == nullptr)
+            return vond::Fail(result, VOND_STATUS_OUT_OF_MEMORY, "VOND_NEW CAAttentionArea[areaArray.numAreas] failed");
+        std::memcpy(records, found.pAreaArray, sizeof(CAAttentionArea) * kept);
+        areas.pAreaArray = records;
+    }
+    areas.isFace = found.isFace;
+    areas.numAreas = kept;
+    return result;
+}
 
 uint32_t VondCALibGetSerializedSize(const _CAAttentionAreaArray& areas) {
     uint32_t size = 0;

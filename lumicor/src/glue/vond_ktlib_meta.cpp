@@ -7,6 +7,7 @@
 #include "ktlib/src/frame/kt_repm_record.h"
 #include "lumicor/src/glue/vond_result.h"
 
+#include <cmath>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -53,6 +54,71 @@ bool QualitySizes(const _KtMetaRepresentative& representative, uint32_t* simlSiz
 }
 
 }  // namespace
+
+_VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEngine, _KtMetaVersion& simlMeta,
+                             _KtMetaSimilarity& similarity, _KtEngineVersion& repmEngine, _KtMetaVersion& repmMeta,
+                             _KtMetaRepresentative& representative, _KtEngineVersion& clblEngine,
+                             _KtMetaVersion& clblMeta, _KtMetaColorLabel& colorLabel) {
+    _VondResult result = vond::Begin("VondKtLibAnalyze");
+    if (pImage == nullptr || pImage->order != ZBM_PIXEL_ORDER_RGB)
+        return vond::Fail(result, VOND_STATUS_INVALID_PARAMETER, "invalid pImage->order");
+
+    // The similarity signature is made from a copy of about 19,200 pixels
+    // (160 x 120 for a 4:3 photo), always a fresh copy.
+    const double W = pImage->width, H = pImage->height;
+    const double smallW = std::sqrt(W * 19200.0 / H), smallH = std::sqrt(H * 19200.0 / W);
+    if (!(smallW >= 1.0 && smallH >= 1.0)) return vond::Fail(result, VOND_STATUS_FAILED, "ZbiuCreate(): failed");
+    ZbmImagePtr small(ZbiuCreate(static_cast<int32_t>(smallW), static_cast<int32_t>(smallH), pImage->order));
+    if (!small) return vond::Fail(result, VOND_STATUS_OUT_OF_MEMORY, "ZbiuCreate(): failed");
+    const int resized = ZbiuResize(pImage, small.get());
+    if (resized != ZBIU_OK) {
+        return vond::Fail(result, resized == ZBIU_ERR_OUT_OF_MEMORY ? VOND_STATUS_OUT_OF_MEMORY : VOND_STATUS_FAILED,
+                          "ZbiuResize(): failed");
+    }
+
+    // Format 0: RGB, as the working image is.
+    if (KtSimlGetVersion(&simlMeta, &simlEngine) != KT_OK)
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtSimlGetVersion() failed");
+    std::unique_ptr<_KtMetaSimilarity, SimlDeleter> siml;
+    {
+        _KtMetaSimilarity* out = nullptr;
+        const int status = KtSimlExtract(small->pData, static_cast<unsigned int>(small->width),
+                                         static_cast<unsigned int>(small->height), small->pitch, 0, &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtSimlExtract() failed");
+        siml.reset(out);
+    }
+    similarity = *siml;
+
+    if (KtRepmGetVersion(&repmMeta, &repmEngine) != KT_OK)
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtRepmGetVersion() failed");
+    std::unique_ptr<_KtMetaRepresentative, RepmDeleter> repm;
+    {
+        _KtMetaRepresentative* out = nullptr;
+        const int status = KtRepmExtract(pImage->pData, static_cast<unsigned int>(pImage->width),
+                                         static_cast<unsigned int>(pImage->height), pImage->pitch, 0, siml.get(), &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtRempExtract() failed");
+        repm.reset(out);
+    }
+    {
+        const int status = deepCopyRepm(*repm, representative);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "deepCopyRepm() failed");
+    }
+    // A later failure leaves the caller's record without the copied arrays.
+    auto release = lmk::MakeScopeGuard([&representative] { ktrepm::ReleaseArrays(&representative); });
+
+    if (KtClblGetVersion(&clblMeta, &clblEngine) != KT_OK)
+        return vond::Fail(result, VOND_STATUS_FAILED, "KtClblGetVersion() failed");
+    std::unique_ptr<_KtMetaColorLabel, ClblDeleter> clbl;
+    {
+        _KtMetaColorLabel* out = nullptr;
+        const int status = KtClblExtract(siml.get(), &out);
+        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtClblExtract() failed");
+        clbl.reset(out);
+    }
+    colorLabel = *clbl;
+    release.Dismiss();
+    return result;
+}
 
 uint32_t VondKtLibGetSerializedSize(const _KtMetaSimilarity&, const _KtMetaRepresentative& representative,
                                     const _KtMetaColorLabel&) {
