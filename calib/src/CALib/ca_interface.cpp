@@ -12,41 +12,13 @@
 #include "calib/src/attention/visual_attention.h"
 #include "calib/src/plane/image_plane.h"
 #include "common/src/internal/memory.h"
+#include "common/src/internal/portable_math.h"
 #include <lumicor/lmk.h>
 #include "oriel/src/pixdif/pixdif_detector.h"
 
 namespace {
 
 constexpr double kPi = 3.14159265358979323846;
-
-// atan on [0, 1]: atan(k/8) from a table plus the series of the small rest.
-double Atan01(double t) {
-    static const double kAtanEighths[9] = {0x0.0p+0,
-                                           0x1.fd5ba9aac2f6ep-4,
-                                           0x1.f5b75f92c80ddp-3,
-                                           0x1.6f61941e4def1p-2,
-                                           0x1.dac670561bb4fp-2,
-                                           0x1.1e00babdefeb4p-1,
-                                           0x1.4978fa3269ee1p-1,
-                                           0x1.700a7c5784634p-1,
-                                           0x1.921fb54442d18p-1};
-    const int k = static_cast<int>(t * 8.0 + 0.5);
-    const double c = k / 8.0;
-    const double u = (t - c) / (1.0 + t * c);
-    const double u2 = u * u;
-    double sum = 0.0;
-    for (int n = 21; n >= 3; n -= 2) sum = (sum + ((n / 2) % 2 ? -1.0 : 1.0) / n) * u2;
-    return kAtanEighths[k] + u + u * sum;
-}
-
-// atan2 from IEEE basic operations only, so that every target agrees to the bit.
-double Atan2(double y, double x) {
-    const double ay = std::fabs(y), ax = std::fabs(x);
-    if (ay == 0.0 && ax == 0.0) return std::signbit(x) ? std::copysign(kPi, y) : y;
-    double t = ay <= ax ? Atan01(ay / ax) : kPi / 2 - Atan01(ax / ay);
-    if (std::signbit(x)) t = kPi - t;
-    return std::copysign(t, y);
-}
 
 // Truncation toward zero of a pixel coordinate; non-finite or huge values
 // from the host are held to +-2^24.
@@ -161,7 +133,7 @@ int32_t CAinterface::DirectionCode(float roll, float pitch, float yaw) {
     const float b = static_cast<float>(static_cast<double>(pitch) / (kPi / 2));
     const float r = static_cast<float>(std::sqrt(static_cast<double>(a) * a + static_cast<double>(b) * b));
     if (r <= 1.0f / 18.0f) return 0;
-    const float theta = static_cast<float>(Atan2(-static_cast<double>(b), static_cast<double>(a)));
+    const float theta = static_cast<float>(lmk::Atan2(-static_cast<double>(b), static_cast<double>(a)));
     float phi = theta + roll;
     if (phi < -kPi) {
         phi = static_cast<float>(phi + 2 * kPi);
