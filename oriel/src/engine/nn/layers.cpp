@@ -345,6 +345,118 @@ struct Avx2Depthwise {
 };
 __attribute__((target("avx2"), flatten)) void DepthwiseWide(const DepthwiseJob& j) { DepthwiseLoops<Avx2Depthwise>(j); }
 bool UseWide(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
+
+// Sixteen-float AVX-512 variant: one register holds two blocks of 8 output
+// channels, each output still summed over taps and input channels in the
+// same order, multiply and add separate.
+#define ORIEL_AVX512 __attribute__((target("avx512f,avx512dq")))
+struct Avx512Kernel {
+    // Q pixels, output channels of blocks cb and cb + 1 (w0, w1 their weights).
+    template <int Q>
+    static ORIEL_AVX512 inline void RunStore(const float* const* x, size_t rowStep, int kh, int kw, int cin,
+                                             const float* w0, const float* w1, const float* bias, int n, Act act,
+                                             float* const* out) {
+        __m512 acc[Q];
+        for (int p = 0; p < Q; ++p) acc[p] = _mm512_setzero_ps();
+        for (int ky = 0; ky < kh; ++ky) {
+            for (int kx = 0; kx < kw; ++kx) {
+                const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
+                const size_t woff = (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
+                const float* wa = w0 + woff;
+                const float* wb = w1 + woff;
+                const float* xp[Q];
+                for (int p = 0; p < Q; ++p) xp[p] = x[p] + tap;
+                for (int ci = 0; ci < cin; ++ci, wa += kBlock, wb += kBlock) {
+                    const __m512 wt = _mm512_insertf32x8(_mm512_castps256_ps512(_mm256_loadu_ps(wa)), _mm256_loadu_ps(wb), 1);
+                    for (int p = 0; p < Q; ++p)
+                        acc[p] = _mm512_add_ps(acc[p], _mm512_mul_ps(_mm512_set1_ps(xp[p][ci]), wt));
+                }
+            }
+        }
+        const __m512 b = _mm512_loadu_ps(bias), zero = _mm512_setzero_ps();
+        const __mmask16 keep = static_cast<__mmask16>(n >= 16 ? 0xFFFFu : ((1u << n) - 1u));
+        for (int p = 0; p < Q; ++p) {
+            __m512 v = _mm512_add_ps(acc[p], b);
+            switch (act) {
+                case Act::Relu: v = _mm512_maskz_mov_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), v); break;
+                case Act::Relu6: {
+                    const __m512 six = _mm512_set1_ps(6.0f);
+                    const __m512 t = _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, six, _CMP_LT_OQ), six, v);
+                    v = _mm512_maskz_mov_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), t);
+                    break;
+                }
+                case Act::Leaky:
+                    v = _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), _mm512_mul_ps(v, _mm512_set1_ps(0.1f)), v);
+                    break;
+                case Act::None:
+                default: break;
+            }
+            _mm512_mask_storeu_ps(out[p], keep, v);
+        }
+    }
+};
+
+// Q pixels of row oy from column ox, output channels [8 cb, 8 cb + 16).
+template <int Q>
+ORIEL_AVX512 inline void ConvPixels16(const ConvJob& j, int cb, int oy, int ox) {
+    const ConvWeights& w = *j.w;
+    const int cols = j.flat ? j.ho * j.wo : j.wo;
+    const int step = j.flat ? 1 : j.stride;
+    const float* row = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep;
+    float* orow = j.out + static_cast<size_t>(oy) * cols * w.cout + cb * kBlock;
+    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
+    const float* wb = w.w + static_cast<size_t>(cb) * blockFloats;
+    const float* x[Q];
+    float* o[Q];
+    for (int k = 0; k < Q; ++k) {
+        x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
+        o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
+    }
+    const int n = (w.cout - cb * kBlock) < 2 * kBlock ? (w.cout - cb * kBlock) : 2 * kBlock;
+    Avx512Kernel::RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, wb, wb + blockFloats, w.b + cb * kBlock, n, j.act, o);
+}
+
+// Pairs of blocks in 16-float registers; an odd last block goes through
+// the AVX2 kernel. Loop order as in ConvLoops.
+template <int P>
+ORIEL_AVX512 inline void ConvRows16(const ConvJob& j, int cb, int oy, int cols) {
+    int ox = 0;
+    for (; ox + P <= cols; ox += P) ConvPixels16<P>(j, cb, oy, ox);
+    for (; ox < cols; ++ox) ConvPixels16<1>(j, cb, oy, ox);
+}
+__attribute__((target("avx512f,avx512dq,avx2"), flatten)) void ConvWidest(const ConvJob& j) {
+    const int P = 12;
+    const ConvWeights& w = *j.w;
+    const int blocks = (w.cout + kBlock - 1) / kBlock;
+    const int pairs = blocks / 2;
+    const int rows = j.flat ? 1 : j.ho;
+    const int cols = j.flat ? j.ho * j.wo : j.wo;
+    const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
+    if (weightBytes <= 64 * 1024) {
+        for (int oy = 0; oy < rows; ++oy) {
+            int ox = 0;
+            for (; ox + P <= cols; ox += P) {
+                for (int cp = 0; cp < pairs; ++cp) ConvPixels16<P>(j, 2 * cp, oy, ox);
+                if (blocks % 2) ConvPixels<Avx2Kernel, 8>(j, blocks - 1, oy, ox), ConvPixels<Avx2Kernel, P - 8>(j, blocks - 1, oy, ox + 8);
+            }
+            for (; ox < cols; ++ox) {
+                for (int cp = 0; cp < pairs; ++cp) ConvPixels16<1>(j, 2 * cp, oy, ox);
+                if (blocks % 2) ConvPixels<Avx2Kernel, 1>(j, blocks - 1, oy, ox);
+            }
+        }
+        return;
+    }
+    for (int cp = 0; cp < pairs; ++cp)
+        for (int oy = 0; oy < rows; ++oy) ConvRows16<P>(j, 2 * cp, oy, cols);
+    if (blocks % 2) {
+        for (int oy = 0; oy < rows; ++oy) {
+            int ox = 0;
+            for (; ox + 8 <= cols; ox += 8) ConvPixels<Avx2Kernel, 8>(j, blocks - 1, oy, ox);
+            for (; ox < cols; ++ox) ConvPixels<Avx2Kernel, 1>(j, blocks - 1, oy, ox);
+        }
+    }
+}
+bool UseWidest(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq"); }
 #elif defined(__ARM_NEON)
 // 32-bit ARM: the compiler keeps generic float vectors on the (IEEE) VFP
 // unit, one lane at a time, because NEON flushes subnormal numbers to zero.
@@ -447,6 +559,12 @@ Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int st
     job.w = &w;
     job.out = out.d;
     job.act = act;
+#if defined(__x86_64__) || defined(__i386__)
+    if (UseWidest(kernels)) {
+        ConvWidest(job);
+        return out;
+    }
+#endif
     if (UseWide(kernels))
         ConvWide(job);
     else
