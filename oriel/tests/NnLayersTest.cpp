@@ -119,7 +119,9 @@ INSTANTIATE_TEST_SUITE_P(
                       ConvCase{10, 10, 8, 9, 3, 1, Pad::Same, Act::Leaky},     // padded 3x3
                       ConvCase{15, 15, 3, 8, 7, 2, Pad::Valid, Act::Relu},     // 7x7 stride 2 without padding
                       ConvCase{6, 5, 16, 24, 1, 2, Pad::Same, Act::None},      // strided 1x1 projection
-                      ConvCase{12, 19, 40, 25, 1, 1, Pad::Same, Act::None}));  // many pixels, channel tail
+                      ConvCase{12, 19, 40, 25, 1, 1, Pad::Same, Act::None},    // many pixels, channel tail
+                      ConvCase{7, 11, 300, 52, 1, 1, Pad::Same, Act::Relu6},   // weights past the cache: blocks outer
+                      ConvCase{6, 5, 70, 33, 3, 2, Pad::Same, Act::Relu6}));   // few pixels per row, odd block count
 
 TEST(NnLayersTest, DepthwiseMatchesDirectComputation) {
     for (int stride = 1; stride <= 2; ++stride) {

@@ -373,8 +373,9 @@ struct Avx512Kernel {
                 }
             }
         }
-        const __m512 b = _mm512_loadu_ps(bias), zero = _mm512_setzero_ps();
+        // The bias of an odd last block has 8 floats only.
         const __mmask16 keep = static_cast<__mmask16>(n >= 16 ? 0xFFFFu : ((1u << n) - 1u));
+        const __m512 b = _mm512_maskz_loadu_ps(keep, bias), zero = _mm512_setzero_ps();
         for (int p = 0; p < Q; ++p) {
             __m512 v = _mm512_add_ps(acc[p], b);
             switch (act) {
@@ -396,65 +397,60 @@ struct Avx512Kernel {
     }
 };
 
-// Q pixels of row oy from column ox, output channels [8 cb, 8 cb + 16).
+// Q output pixels from pixel index q0 (row-major over the whole output,
+// so that groups run on across rows), output channels [8 cb, 8 cb + 16).
+// A last odd block runs in both halves of the register; only its own half
+// is stored.
 template <int Q>
-ORIEL_AVX512 inline void ConvPixels16(const ConvJob& j, int cb, int oy, int ox) {
+ORIEL_AVX512 inline void ConvGroup16(const ConvJob& j, int cb, int q0) {
     const ConvWeights& w = *j.w;
-    const int cols = j.flat ? j.ho * j.wo : j.wo;
-    const int step = j.flat ? 1 : j.stride;
-    const float* row = j.src + static_cast<size_t>(oy) * j.stride * j.rowStep;
-    float* orow = j.out + static_cast<size_t>(oy) * cols * w.cout + cb * kBlock;
     const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
-    const float* wb = w.w + static_cast<size_t>(cb) * blockFloats;
+    const float* w0 = w.w + static_cast<size_t>(cb) * blockFloats;
+    const int left = w.cout - cb * kBlock;
+    const float* w1 = left > kBlock ? w0 + blockFloats : w0;
+    const int n = left < 2 * kBlock ? left : 2 * kBlock;
     const float* x[Q];
     float* o[Q];
+    int oy = q0 / j.wo, ox = q0 - oy * j.wo;
     for (int k = 0; k < Q; ++k) {
-        x[k] = row + static_cast<size_t>(ox + k) * step * j.cin;
-        o[k] = orow + static_cast<size_t>(ox + k) * w.cout;
+        x[k] = j.flat ? j.src + static_cast<size_t>(q0 + k) * j.cin
+                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * j.cin;
+        o[k] = j.out + static_cast<size_t>(q0 + k) * w.cout + cb * kBlock;
+        if (++ox == j.wo) {
+            ox = 0;
+            ++oy;
+        }
     }
-    const int n = (w.cout - cb * kBlock) < 2 * kBlock ? (w.cout - cb * kBlock) : 2 * kBlock;
-    Avx512Kernel::RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, wb, wb + blockFloats, w.b + cb * kBlock, n, j.act, o);
+    Avx512Kernel::RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, w0, w1, w.b + cb * kBlock, n, j.act, o);
 }
 
-// Pairs of blocks in 16-float registers; an odd last block goes through
-// the AVX2 kernel. Loop order as in ConvLoops.
+// Pixels [q0, q1) in groups of P, the rest in groups of 8, 4, 2 and 1 (a
+// single accumulator would wait on each add in turn).
 template <int P>
-ORIEL_AVX512 inline void ConvRows16(const ConvJob& j, int cb, int oy, int cols) {
-    int ox = 0;
-    for (; ox + P <= cols; ox += P) ConvPixels16<P>(j, cb, oy, ox);
-    for (; ox < cols; ++ox) ConvPixels16<1>(j, cb, oy, ox);
+ORIEL_AVX512 inline void ConvRange16(const ConvJob& j, int cb, int q0, int q1) {
+    int q = q0;
+    for (; q + P <= q1; q += P) ConvGroup16<P>(j, cb, q);
+    if (q + 8 <= q1) ConvGroup16<8>(j, cb, q), q += 8;
+    if (q + 4 <= q1) ConvGroup16<4>(j, cb, q), q += 4;
+    if (q + 2 <= q1) ConvGroup16<2>(j, cb, q), q += 2;
+    if (q < q1) ConvGroup16<1>(j, cb, q);
 }
-__attribute__((target("avx512f,avx512dq,avx2"), flatten)) void ConvWidest(const ConvJob& j) {
-    const int P = 12;
+
+// Loop order as in ConvLoops.
+__attribute__((target("avx512f,avx512dq"), flatten)) void ConvWidest(const ConvJob& j) {
+    const int P = 16;
     const ConvWeights& w = *j.w;
     const int blocks = (w.cout + kBlock - 1) / kBlock;
-    const int pairs = blocks / 2;
-    const int rows = j.flat ? 1 : j.ho;
-    const int cols = j.flat ? j.ho * j.wo : j.wo;
+    const int total = j.ho * j.wo;
     const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
     if (weightBytes <= 64 * 1024) {
-        for (int oy = 0; oy < rows; ++oy) {
-            int ox = 0;
-            for (; ox + P <= cols; ox += P) {
-                for (int cp = 0; cp < pairs; ++cp) ConvPixels16<P>(j, 2 * cp, oy, ox);
-                if (blocks % 2) ConvPixels<Avx2Kernel, 8>(j, blocks - 1, oy, ox), ConvPixels<Avx2Kernel, P - 8>(j, blocks - 1, oy, ox + 8);
-            }
-            for (; ox < cols; ++ox) {
-                for (int cp = 0; cp < pairs; ++cp) ConvPixels16<1>(j, 2 * cp, oy, ox);
-                if (blocks % 2) ConvPixels<Avx2Kernel, 1>(j, blocks - 1, oy, ox);
-            }
+        for (int q = 0; q < total; q += P) {
+            const int end = total - q < P ? total : q + P;
+            for (int cb = 0; cb < blocks; cb += 2) ConvRange16<P>(j, cb, q, end);
         }
         return;
     }
-    for (int cp = 0; cp < pairs; ++cp)
-        for (int oy = 0; oy < rows; ++oy) ConvRows16<P>(j, 2 * cp, oy, cols);
-    if (blocks % 2) {
-        for (int oy = 0; oy < rows; ++oy) {
-            int ox = 0;
-            for (; ox + 8 <= cols; ox += 8) ConvPixels<Avx2Kernel, 8>(j, blocks - 1, oy, ox);
-            for (; ox < cols; ++ox) ConvPixels<Avx2Kernel, 1>(j, blocks - 1, oy, ox);
-        }
-    }
+    for (int cb = 0; cb < blocks; cb += 2) ConvRange16<P>(j, cb, 0, total);
 }
 bool UseWidest(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq"); }
 #elif defined(__ARM_NEON)
