@@ -42,6 +42,7 @@ void BM_Conv(benchmark::State& state) {
 BENCHMARK(BM_Conv)
     ->Args({22, 512, 512, 1, 0, 1})
     ->Args({22, 512, 512, 1, 1, 1})
+    ->Args({9, 1024, 1024, 1, 1, 1})
     ->Args({140, 32, 64, 1, 1, 1})
     ->Args({35, 32, 32, 3, 0, 1})
     ->Args({35, 32, 32, 3, 1, 1})
