@@ -490,7 +490,9 @@ struct Avx512Depthwise {
 __attribute__((target("avx512f,avx512dq"), flatten)) void DepthwiseWidest(const DepthwiseJob& j) {
     DepthwiseLoops<Avx512Depthwise>(j);
 }
-bool UseWidest(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq"); }
+bool UseWidest(KernelChoice k) {
+    return k == KernelChoice::Best && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq");
+}
 #elif defined(__ARM_NEON)
 // 32-bit ARM: the compiler keeps generic float vectors on the (IEEE) VFP
 // unit, one lane at a time, because NEON flushes subnormal numbers to zero.
