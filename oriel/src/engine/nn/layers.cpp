@@ -204,6 +204,62 @@ ORIEL_INLINE void ConvLoops(const ConvJob& j) {
     }
 }
 
+// Kernels over two blocks of output channels at once (K::RunStore with
+// the weights of both): Q output pixels from pixel index q0 (row-major
+// over the whole output, so that groups run on across rows), output
+// channels [8 cb, 8 cb + 16). A last odd block is computed twice; only
+// its own outputs are stored.
+template <class K, int Q>
+ORIEL_INLINE void ConvPairGroup(const ConvJob& j, int cb, int q0) {
+    const ConvWeights& w = *j.w;
+    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
+    const float* w0 = w.w + static_cast<size_t>(cb) * blockFloats;
+    const int left = w.cout - cb * kBlock;
+    const float* w1 = left > kBlock ? w0 + blockFloats : w0;
+    const int n = left < 2 * kBlock ? left : 2 * kBlock;
+    const float* x[Q];
+    float* o[Q];
+    int oy = q0 / j.wo, ox = q0 - oy * j.wo;
+    for (int k = 0; k < Q; ++k) {
+        x[k] = j.flat ? j.src + static_cast<size_t>(q0 + k) * j.cin
+                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * j.cin;
+        o[k] = j.out + static_cast<size_t>(q0 + k) * w.cout + cb * kBlock;
+        if (++ox == j.wo) {
+            ox = 0;
+            ++oy;
+        }
+    }
+    K::template RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, w0, w1, w.b + cb * kBlock, n, j.act, o);
+}
+
+// Pixels [q0, q1) in groups of P, the rest in groups of 8, 4, 2 and 1 (a
+// single accumulator would wait on each add in turn).
+template <class K, int P>
+ORIEL_INLINE void ConvPairRange(const ConvJob& j, int cb, int q0, int q1) {
+    int q = q0;
+    for (; q + P <= q1; q += P) ConvPairGroup<K, P>(j, cb, q);
+    if (q + 8 <= q1) ConvPairGroup<K, 8>(j, cb, q), q += 8;
+    if (q + 4 <= q1) ConvPairGroup<K, 4>(j, cb, q), q += 4;
+    if (q + 2 <= q1) ConvPairGroup<K, 2>(j, cb, q), q += 2;
+    if (q < q1) ConvPairGroup<K, 1>(j, cb, q);
+}
+
+// Loop order as in ConvLoops.
+template <class K, int P>
+ORIEL_INLINE void ConvPairLoops(const ConvJob& j) {
+    const ConvWeights& w = *j.w;
+    const int blocks = (w.cout + kBlock - 1) / kBlock;
+    const int total = j.ho * j.wo;
+    const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
+    if (weightBytes <= 64 * 1024) {
+        for (int q = 0; q < total; q += P) {
+            const int end = total - q < P ? total : q + P;
+            for (int cb = 0; cb < blocks; cb += 2) ConvPairRange<K, P>(j, cb, q, end);
+        }
+        return;
+    }
+    for (int cb = 0; cb < blocks; cb += 2) ConvPairRange<K, P>(j, cb, 0, total);
+}
 struct DepthwiseJob {
     const float* src;  // the unpadded input
     size_t rowStep;
@@ -413,61 +469,6 @@ struct Avx512Kernel {
     }
 };
 
-// Q output pixels from pixel index q0 (row-major over the whole output,
-// so that groups run on across rows), output channels [8 cb, 8 cb + 16).
-// A last odd block runs in both halves of the register; only its own half
-// is stored.
-template <int Q>
-ORIEL_AVX512 inline void ConvGroup16(const ConvJob& j, int cb, int q0) {
-    const ConvWeights& w = *j.w;
-    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
-    const float* w0 = w.w + static_cast<size_t>(cb) * blockFloats;
-    const int left = w.cout - cb * kBlock;
-    const float* w1 = left > kBlock ? w0 + blockFloats : w0;
-    const int n = left < 2 * kBlock ? left : 2 * kBlock;
-    const float* x[Q];
-    float* o[Q];
-    int oy = q0 / j.wo, ox = q0 - oy * j.wo;
-    for (int k = 0; k < Q; ++k) {
-        x[k] = j.flat ? j.src + static_cast<size_t>(q0 + k) * j.cin
-                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * j.cin;
-        o[k] = j.out + static_cast<size_t>(q0 + k) * w.cout + cb * kBlock;
-        if (++ox == j.wo) {
-            ox = 0;
-            ++oy;
-        }
-    }
-    Avx512Kernel::RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, w0, w1, w.b + cb * kBlock, n, j.act, o);
-}
-
-// Pixels [q0, q1) in groups of P, the rest in groups of 8, 4, 2 and 1 (a
-// single accumulator would wait on each add in turn).
-template <int P>
-ORIEL_AVX512 inline void ConvRange16(const ConvJob& j, int cb, int q0, int q1) {
-    int q = q0;
-    for (; q + P <= q1; q += P) ConvGroup16<P>(j, cb, q);
-    if (q + 8 <= q1) ConvGroup16<8>(j, cb, q), q += 8;
-    if (q + 4 <= q1) ConvGroup16<4>(j, cb, q), q += 4;
-    if (q + 2 <= q1) ConvGroup16<2>(j, cb, q), q += 2;
-    if (q < q1) ConvGroup16<1>(j, cb, q);
-}
-
-// Loop order as in ConvLoops.
-__attribute__((target("avx512f,avx512dq"), flatten)) void ConvWidest(const ConvJob& j) {
-    const int P = 16;
-    const ConvWeights& w = *j.w;
-    const int blocks = (w.cout + kBlock - 1) / kBlock;
-    const int total = j.ho * j.wo;
-    const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
-    if (weightBytes <= 64 * 1024) {
-        for (int q = 0; q < total; q += P) {
-            const int end = total - q < P ? total : q + P;
-            for (int cb = 0; cb < blocks; cb += 2) ConvRange16<P>(j, cb, q, end);
-        }
-        return;
-    }
-    for (int cb = 0; cb < blocks; cb += 2) ConvRange16<P>(j, cb, 0, total);
-}
 struct Avx512Depthwise {
     static const int kWidth = 16;
     static ORIEL_AVX512 inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw,
@@ -489,6 +490,9 @@ struct Avx512Depthwise {
 };
 __attribute__((target("avx512f,avx512dq"), flatten)) void DepthwiseWidest(const DepthwiseJob& j) {
     DepthwiseLoops<Avx512Depthwise>(j);
+}
+__attribute__((target("avx512f,avx512dq"), flatten)) void ConvWidest(const ConvJob& j) {
+    ConvPairLoops<Avx512Kernel, 16>(j);
 }
 bool UseWidest(KernelChoice k) {
     return k == KernelChoice::Best && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq");
