@@ -8,7 +8,7 @@ namespace nn {
 namespace {
 
 // Columns handled per pass (their sampling positions live on the stack).
-const int kColumnChunk = 512;
+const int kColumnChunk = 256;
 
 // Start of canvas row y in the photo, or null outside the crop.
 inline const uint8_t* CanvasRow(const ImageView& img, const Crop& crop, const Canvas& cv, int y) {

@@ -222,7 +222,8 @@ ORIEL_INLINE void ConvPairGroup(const ConvJob& j, int cb, int q0) {
     int oy = q0 / j.wo, ox = q0 - oy * j.wo;
     for (int k = 0; k < Q; ++k) {
         x[k] = j.flat ? j.src + static_cast<size_t>(q0 + k) * j.cin
-                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep + static_cast<size_t>(ox) * j.stride * j.cin;
+                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep +
+                            static_cast<size_t>(ox) * j.stride * j.cin;
         o[k] = j.out + static_cast<size_t>(q0 + k) * w.cout + cb * kBlock;
         if (++ox == j.wo) {
             ox = 0;
@@ -334,9 +335,6 @@ void ConvPortable(const ConvJob& j) { ConvLoops<Stored<PortableKernel>, 4>(j); }
 void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<PortableDepthwise>(j); }
 
 #if defined(__x86_64__) || defined(__i386__)
-// Eight-float AVX2 variants, chosen at run time; same values as above.
-// One 8-float register per block of output channels, the input values
-// broadcast from memory; multiply and add stay separate instructions.
 // The values of BiasActivate (max and min return the zero or six where its
 // comparisons pick them).
 __attribute__((target("avx2"))) inline __m256 Avx2Activate(__m256 v, Act act) {
@@ -350,6 +348,9 @@ __attribute__((target("avx2"))) inline __m256 Avx2Activate(__m256 v, Act act) {
         default: return v;
     }
 }
+// Eight-float AVX2 variants, chosen at run time; same values as above.
+// One 8-float register per block of output channels, the input values
+// broadcast from memory; multiply and add stay separate instructions.
 struct Avx2Kernel {
     template <int P>
     static __attribute__((target("avx2"))) inline void Run(const float* const* x, size_t rowStep, int kh,
@@ -398,17 +399,18 @@ struct Avx2Depthwise {
     static __attribute__((target("avx2"))) inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh,
                                                            int kw, const float* bias, Act act, float* out) {
         __m256 acc = _mm256_setzero_ps();
+        const size_t cs = static_cast<size_t>(c);
         if (kh == 3 && kw == 3) {
             // The common case, unrolled.
             for (int ky = 0; ky < 3; ++ky)
                 for (int kx = 0; kx < 3; ++kx)
-                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
-                                                           _mm256_loadu_ps(w + (static_cast<size_t>(ky) * 3 + kx) * c)));
+                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm256_loadu_ps(w + (ky * 3 + kx) * cs)));
         } else {
             for (int ky = 0; ky < kh; ++ky)
                 for (int kx = 0; kx < kw; ++kx)
-                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
-                                                           _mm256_loadu_ps(w + (static_cast<size_t>(ky) * kw + kx) * c)));
+                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm256_loadu_ps(w + (ky * kw + kx) * cs)));
         }
         _mm256_storeu_ps(out, Avx2Activate(_mm256_add_ps(acc, _mm256_loadu_ps(bias)), act));
     }
@@ -431,7 +433,8 @@ ORIEL_AVX512 inline __m512 Avx512Activate(__m512 v, Act act) {
             return _mm512_maskz_mov_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), t);
         }
         case Act::Leaky:
-            return _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), _mm512_mul_ps(v, _mm512_set1_ps(0.1f)), v);
+            return _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), _mm512_mul_ps(v, _mm512_set1_ps(0.1f)),
+                                        v);
         case Act::None:
         default: return v;
     }
@@ -453,7 +456,8 @@ struct Avx512Kernel {
                 const float* xp[Q];
                 for (int p = 0; p < Q; ++p) xp[p] = x[p] + tap;
                 for (int ci = 0; ci < cin; ++ci, wa += kBlock, wb += kBlock) {
-                    const __m512 wt = _mm512_insertf32x8(_mm512_castps256_ps512(_mm256_loadu_ps(wa)), _mm256_loadu_ps(wb), 1);
+                    const __m512 wt =
+                        _mm512_insertf32x8(_mm512_castps256_ps512(_mm256_loadu_ps(wa)), _mm256_loadu_ps(wb), 1);
                     for (int p = 0; p < Q; ++p)
                         acc[p] = _mm512_add_ps(acc[p], _mm512_mul_ps(_mm512_set1_ps(xp[p][ci]), wt));
                 }
@@ -474,16 +478,17 @@ struct Avx512Depthwise {
     static ORIEL_AVX512 inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw,
                                         const float* bias, Act act, float* out) {
         __m512 acc = _mm512_setzero_ps();
+        const size_t cs = static_cast<size_t>(c);
         if (kh == 3 && kw == 3) {
             for (int ky = 0; ky < 3; ++ky)
                 for (int kx = 0; kx < 3; ++kx)
-                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
-                                                           _mm512_loadu_ps(w + (static_cast<size_t>(ky) * 3 + kx) * c)));
+                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm512_loadu_ps(w + (ky * 3 + kx) * cs)));
         } else {
             for (int ky = 0; ky < kh; ++ky)
                 for (int kx = 0; kx < kw; ++kx)
-                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
-                                                           _mm512_loadu_ps(w + (static_cast<size_t>(ky) * kw + kx) * c)));
+                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm512_loadu_ps(w + (ky * kw + kx) * cs)));
         }
         _mm512_storeu_ps(out, Avx512Activate(_mm512_add_ps(acc, _mm512_loadu_ps(bias)), act));
     }
