@@ -487,7 +487,7 @@ bool FaceEngine::Expressions(const nn::ImageView& img, const Landmarks& lm, floa
     for (int i = 1; i < 7; ++i) mx = std::fmax(mx, logits[i]);
     float sum = 0.0f;
     for (int i = 0; i < 7; ++i) {
-        probs[i] = std::exp(logits[i] - mx);
+        probs[i] = lmk::ExpF(logits[i] - mx);
         sum += probs[i];
     }
     for (int i = 0; i < 7; ++i) probs[i] /= sum;
