@@ -4,6 +4,8 @@
 
 #include <vector>
 
+#include "common/src/image/resize.h"
+#include "testkit/fault.h"
 #include "testkit/images.h"
 
 namespace {
@@ -264,6 +266,44 @@ TEST(ImageResizeTest, KeepsTheRecordedResults) {
         const uint32_t hash = Fnv1a(dst.get());
         EXPECT_EQ(hash, c.hash) << c.sw << "x" << c.sh << " -> " << c.dw << "x" << c.dh << " order " << c.order;
     }
+}
+
+// Several sizes of one photo at once give what one resize per size gives,
+// whether the pyramids share levels, whatever other path a size takes, and
+// out of memory reports 4.
+TEST(ImageResizeTest, ResizeEachMatchesOneResizePerSize) {
+    const struct {
+        int32_t sw, sh;
+        _zbm_PixelOrder order;
+        std::vector<std::pair<int32_t, int32_t>> sizes;
+    } cases[] = {
+        {1203, 901, ZBM_PIXEL_ORDER_RGB, {{640, 480}, {40, 30}}},               // 602 x 451 shared, then apart
+        {1600, 1200, ZBM_PIXEL_ORDER_BGRA, {{40, 30}, {400, 300}, {99, 75}}},  // depths 6, 1 and 3
+        {800, 600, ZBM_PIXEL_ORDER_GRAY, {{100, 75}, {800, 600}, {500, 900}, {45, 601}, {13, 10}}},
+        {640, 480, ZBM_PIXEL_ORDER_RGB, {{320, 240}, {40, 30}}},                // only one pyramid
+    };
+    for (const auto& c : cases) {
+        ZbmImagePtr src = MakeNoiseImage(c.sw, c.sh, c.order, static_cast<uint32_t>(c.sw));
+        std::vector<ZbmImagePtr> got, want;
+        std::vector<_zbm_Image*> targets;
+        for (const auto& size : c.sizes) {
+            got.emplace_back(ZbiuCreate(size.first, size.second, c.order));
+            targets.push_back(got.back().get());
+            want.push_back(Resized(src.get(), size.first, size.second));
+        }
+        ASSERT_EQ(lmk::image::ResizeEach(src.get(), targets.data(), static_cast<int32_t>(targets.size())), ZBIU_OK);
+        for (size_t i = 0; i < got.size(); ++i)
+            EXPECT_TRUE(SameImage(got[i].get(), want[i].get())) << c.sw << "x" << c.sh << " size " << i;
+
+        int status = -1;
+        const long allocations = lumicor::test::ForEachAllocationFailure(
+            [&] { status = lmk::image::ResizeEach(src.get(), targets.data(), static_cast<int32_t>(targets.size())); },
+            [&](long, bool triggered) { EXPECT_EQ(status, triggered ? ZBIU_ERR_OUT_OF_MEMORY : ZBIU_OK); });
+        EXPECT_GT(allocations, 0);
+    }
+    ZbmImagePtr src(ZbiuCreate(8, 8, ZBM_PIXEL_ORDER_RGB)), gray(ZbiuCreate(4, 4, ZBM_PIXEL_ORDER_GRAY));
+    _zbm_Image* const mismatched[] = {gray.get()};
+    EXPECT_EQ(lmk::image::ResizeEach(src.get(), mismatched, 1), ZBIU_ERR_INVALID_ARGUMENT);
 }
 
 TEST(ImageResizeTest, RejectsMismatchedImages) {

@@ -21,6 +21,7 @@
 #endif
 
 #include "common/src/image/image_util.h"
+#include "common/src/image/resize.h"
 #include "common/src/internal/memory.h"
 
 using namespace lmk::image;
@@ -281,21 +282,55 @@ bool HalveAgain(int32_t w, int32_t h, const _zbm_Image* dst) { return w / dst->w
 // Every level roughly halves a dimension of at most 2^31 pixels.
 constexpr int32_t kMaxLevels = 32;
 
+// Continues a pyramid whose last level is levels[n]: halves while HalveAgain
+// holds, then one final reduction produces dst.
+int ContinuePyramid(Level* levels, int32_t n, int32_t bpp, _zbm_Image* dst) {
+    while (HalveAgain(levels[n].width, levels[n].height, dst)) {
+        if (n == kMaxLevels) return ZBIU_ERR_INVALID_ARGUMENT;
+        const Level& above = levels[n];
+        if (!levels[n + 1].Init(&levels[n], (above.width + 1) / 2, (above.height + 1) / 2, bpp))
+            return ZBIU_ERR_OUT_OF_MEMORY;
+        ++n;
+    }
+    return Finish(&levels[n], dst, true);
+}
+
 // Strong reduction: halve both dimensions to ((n + 1) / 2) with the
 // reduction rule, and repeat while HalveAgain holds; one final reduction then
 // produces dst. The levels are made row by row as the final pass needs them.
 int ResizePyramid(const _zbm_Image* src, _zbm_Image* dst) {
     Level levels[kMaxLevels + 1];
     levels[0].InitSource(src);
-    int32_t n = 0;
+    const int32_t bpp = src->bytesPerPixel;
+    if (!levels[1].Init(&levels[0], (src->width + 1) / 2, (src->height + 1) / 2, bpp)) return ZBIU_ERR_OUT_OF_MEMORY;
+    return ContinuePyramid(levels, 1, bpp, dst);
+}
+
+// Number of pyramid levels ZbiuResize makes for this pair, 0 when it takes
+// another path.
+int32_t PyramidDepth(const _zbm_Image* src, const _zbm_Image* dst) {
+    const int32_t sw = src->width, sh = src->height, dw = dst->width, dh = dst->height;
+    if (dw > sw || dh > sh || !MoreThanTwice(sw, sh, dst)) return 0;
+    int32_t w = sw, h = sh, n = 0;
     do {
-        if (n == kMaxLevels) return ZBIU_ERR_INVALID_ARGUMENT;
-        const Level& above = levels[n];
-        if (!levels[n + 1].Init(&levels[n], (above.width + 1) / 2, (above.height + 1) / 2, src->bytesPerPixel))
-            return ZBIU_ERR_OUT_OF_MEMORY;
+        w = (w + 1) / 2;
+        h = (h + 1) / 2;
         ++n;
-    } while (HalveAgain(levels[n].width, levels[n].height, dst));
-    return Finish(&levels[n], dst, true);
+    } while (HalveAgain(w, h, dst) && n < kMaxLevels);
+    return n;
+}
+
+// Image of the given size and pixel layout over a caller buffer.
+_zbm_Image ScratchImage(uint8_t* data, int32_t width, int32_t height, const _zbm_Image* like) {
+    _zbm_Image image;
+    image.pData = data;
+    image.width = width;
+    image.height = height;
+    image.pitch = width * like->bytesPerPixel;
+    image.order = like->order;
+    image.bytesPerPixel = like->bytesPerPixel;
+    image.ownsData = 0;
+    return image;
 }
 
 }  // namespace
@@ -318,4 +353,57 @@ int ZbiuResize(const _zbm_Image* src, _zbm_Image* dst) {
     if (dw > sw || dh > sh) return ResizeBilinear(src, dst);
     if (!MoreThanTwice(sw, sh, dst)) return Reduce(src, dst);
     return ResizePyramid(src, dst);
+}
+
+int lmk::image::ResizeEach(const _zbm_Image* src, _zbm_Image* const* dsts, int32_t count) {
+    if (dsts == nullptr && count > 0) return ZBIU_ERR_INVALID_ARGUMENT;
+    // The level every pyramid destination passes through: the shallowest
+    // depth among them.
+    int32_t shared = 0, pyramids = 0;
+    for (int32_t i = 0; i < count; ++i) {
+        if (!IsValidPair(src, dsts[i])) return ZBIU_ERR_INVALID_ARGUMENT;
+        const int32_t depth = PyramidDepth(src, dsts[i]);
+        if (depth == 0) continue;
+        shared = pyramids == 0 || depth < shared ? depth : shared;
+        ++pyramids;
+    }
+    if (pyramids < 2) {
+        for (int32_t i = 0; i < count; ++i) {
+            const int status = ZbiuResize(src, dsts[i]);
+            if (status != ZBIU_OK) return status;
+        }
+        return ZBIU_OK;
+    }
+
+    // Make the shared level once, as a whole image.
+    const int32_t bpp = src->bytesPerPixel;
+    int32_t w = src->width, h = src->height;
+    for (int32_t n = 0; n < shared; ++n) w = (w + 1) / 2, h = (h + 1) / 2;
+    lmk::MallocPtr<uint8_t> buffer(static_cast<uint8_t*>(
+        std::malloc(static_cast<size_t>(w) * static_cast<size_t>(h) * static_cast<size_t>(bpp))));
+    if (!buffer) return ZBIU_ERR_OUT_OF_MEMORY;
+    _zbm_Image level = ScratchImage(buffer.get(), w, h, src);
+    {
+        Level levels[kMaxLevels + 1];
+        levels[0].InitSource(src);
+        for (int32_t n = 1; n < shared; ++n) {
+            if (!levels[n].Init(&levels[n - 1], (levels[n - 1].width + 1) / 2, (levels[n - 1].height + 1) / 2, bpp))
+                return ZBIU_ERR_OUT_OF_MEMORY;
+        }
+        const int status = Finish(&levels[shared - 1], &level, true);
+        if (status != ZBIU_OK) return status;
+    }
+
+    for (int32_t i = 0; i < count; ++i) {
+        int status;
+        if (PyramidDepth(src, dsts[i]) == 0) {
+            status = ZbiuResize(src, dsts[i]);
+        } else {
+            Level levels[kMaxLevels + 1];
+            levels[0].InitSource(&level);
+            status = ContinuePyramid(levels, 0, bpp, dsts[i]);
+        }
+        if (status != ZBIU_OK) return status;
+    }
+    return ZBIU_OK;
 }
