@@ -203,7 +203,8 @@ public:
         height = h;
         rowBytes_ = static_cast<size_t>(w) * static_cast<size_t>(bpp);
         rows_ = lmk::NewUninitializedArray<uint8_t>(2 * rowBytes_);
-        return rows_ && pass_.Init(parent->width, parent->height, w, h, bpp, IsHalving(parent->width, parent->height, w, h));
+        const bool exact = IsHalving(parent->width, parent->height, w, h);
+        return rows_ && pass_.Init(parent->width, parent->height, w, h, bpp, exact);
     }
 
     const uint8_t* RowAt(int32_t y) {
