@@ -137,6 +137,24 @@ void BilinearRowT(const uint8_t* top, const uint8_t* bottom, uint32_t fy, const 
     }
 }
 
+// Bilinear sampling of a row whose width is exactly halved: every column
+// then samples the pair (2x, 2x + 1) with weight 512, and the blend
+// ((1024 - fy)·(512·tl + 512·tr) + fy·(512·bl + 512·br)) >> 20 equals
+// (s(2x) + s(2x + 1)) >> 11 with s = top·(1024 − fy) + bottom·fy per byte.
+// The row blend runs over whole rows and vectorises. This is the step taken
+// by photos with an odd height (4000 × 2667 halves to 2000 × 1334).
+void BlendRows(const uint8_t* top, const uint8_t* bottom, uint32_t fy, int32_t n, uint32_t* sums) {
+    const uint32_t wt = 1024u - fy, wb = fy;
+    for (int32_t i = 0; i < n; ++i) sums[i] = top[i] * wt + bottom[i] * wb;
+}
+
+template <int32_t Bpp>
+void BlendPairsT(const uint32_t* sums, uint8_t* d, int32_t width) {
+    for (int32_t x = 0; x < width; ++x, sums += 2 * Bpp, d += Bpp) {
+        for (int32_t c = 0; c < Bpp; ++c) d[c] = static_cast<uint8_t>((sums[c] + sums[c + Bpp]) >> 11);
+    }
+}
+
 // ---------------------------------------------------------------- one pass
 
 // How an image is made from the one before it, one row at a time: the exact
@@ -149,6 +167,11 @@ public:
         bpp_ = bpp;
         exact_ = exact;
         if (exact) return true;
+        pairs_ = srcWidth == 2 * width;
+        if (pairs_) {
+            sums_ = lmk::NewUninitializedArray<uint32_t>(static_cast<size_t>(srcWidth) * static_cast<size_t>(bpp));
+            if (!sums_) return false;
+        }
         columns_ = lmk::NewArray<AxisSample>(static_cast<size_t>(width));
         rows_ = lmk::NewArray<AxisSample>(static_cast<size_t>(height));
         if (!columns_ || !rows_) return false;
@@ -161,8 +184,17 @@ public:
     // The two source rows of output row y and the weight of the second.
     AxisSample SourceRows(int32_t y) const { return exact_ ? AxisSample{2 * y, 2 * y + 1, 0} : rows_[y]; }
 
-    void MakeRow(const uint8_t* top, const uint8_t* bottom, uint32_t fy, uint8_t* d) const {
+    void MakeRow(const uint8_t* top, const uint8_t* bottom, uint32_t fy, uint8_t* d) {
         if (exact_) return HalveRow(top, bottom, d, width_, bpp_);
+        if (pairs_) {
+            BlendRows(top, bottom, fy, 2 * width_ * bpp_, sums_.get());
+            switch (bpp_) {
+                case 1: BlendPairsT<1>(sums_.get(), d, width_); break;
+                case 3: BlendPairsT<3>(sums_.get(), d, width_); break;
+                default: BlendPairsT<4>(sums_.get(), d, width_); break;
+            }
+            return;
+        }
         switch (bpp_) {
             case 1: BilinearRowT<1>(top, bottom, fy, columns_.get(), d, width_); break;
             case 3: BilinearRowT<3>(top, bottom, fy, columns_.get(), d, width_); break;
@@ -174,6 +206,8 @@ private:
     int32_t width_ = 0;
     int32_t bpp_ = 0;
     bool exact_ = false;
+    bool pairs_ = false;  // bilinear with the width exactly halved
+    lmk::UniqueArray<uint32_t> sums_;
     lmk::UniqueArray<AxisSample> columns_;
     lmk::UniqueArray<AxisSample> rows_;
 };
