@@ -11,6 +11,7 @@
 #include "calib/src/arrange/va_arrange.h"
 #include "calib/src/attention/visual_attention.h"
 #include "calib/src/plane/image_plane.h"
+#include "common/src/image/resize.h"
 #include "common/src/internal/memory.h"
 #include "common/src/internal/portable_math.h"
 #include <lumicor/lmk.h>
@@ -38,21 +39,28 @@ CAinterface::CAinterface() : saliencyMap(nullptr), useFaceInfo(1), debugOutput(0
 
 CAinterface::~CAinterface() { ZbiuDispose(&saliencyMap); }
 
+namespace {
+
+// Size of the copy whose longer side is `size`; true when the image is small
+// enough to be used as it is.
+bool ShrinkSize(const _zbm_Image* image, int32_t size, int32_t* w, int32_t* h) {
+    const float ratio = static_cast<float>(image->height) / static_cast<float>(image->width);
+    if (ratio <= 1.0f) {
+        *w = size;
+        *h = static_cast<int32_t>(std::floor(0.5f + static_cast<float>(size) * ratio));
+        return image->width <= size;
+    }
+    *w = static_cast<int32_t>(std::floor(static_cast<float>(size) / ratio + 0.5f));
+    *h = size;
+    return image->height <= size;
+}
+
+}  // namespace
+
 _zbm_Image* CAinterface::CreateShrinkImage(const _zbm_Image* image, int32_t size) {
     if (image == nullptr) return nullptr;
-    const float ratio = static_cast<float>(image->height) / static_cast<float>(image->width);
     int32_t w, h;
-    bool attach;
-    if (ratio <= 1.0f) {
-        attach = image->width <= size;
-        w = size;
-        h = static_cast<int32_t>(std::floor(0.5f + static_cast<float>(size) * ratio));
-    } else {
-        attach = image->height <= size;
-        w = static_cast<int32_t>(std::floor(static_cast<float>(size) / ratio + 0.5f));
-        h = size;
-    }
-    if (attach) {
+    if (ShrinkSize(image, size, &w, &h)) {
         _zbm_Image* copy = ZbiuCreateAttatchData(image->pData, image->width, image->height, image->pitch, image->order);
         if (copy == nullptr) CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuCreateAttatchData");
         return copy;
@@ -67,6 +75,39 @@ _zbm_Image* CAinterface::CreateShrinkImage(const _zbm_Image* image, int32_t size
         return nullptr;
     }
     return small.release();
+}
+
+bool CAinterface::CreateShrinkImages(const _zbm_Image* image, int32_t size, int32_t secondSize, ZbmImagePtr* first,
+                                     ZbmImagePtr* second) {
+    first->reset();
+    second->reset();
+    if (image == nullptr) return false;
+    int32_t w[2], h[2];
+    const bool attach0 = ShrinkSize(image, size, &w[0], &h[0]);
+    const bool attach1 = ShrinkSize(image, secondSize, &w[1], &h[1]);
+    if (attach0 || attach1) {
+        // At most one reduction: nothing to share.
+        first->reset(CreateShrinkImage(image, size));
+        if (*first) second->reset(CreateShrinkImage(image, secondSize));
+        if (!*second) first->reset();
+        return static_cast<bool>(*second);
+    }
+    ZbmImagePtr small[2];
+    for (int i = 0; i < 2; ++i) {
+        small[i].reset(ZbiuCreate(w[i], h[i], image->order));
+        if (!small[i]) {
+            CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuCreate");
+            return false;
+        }
+    }
+    _zbm_Image* const targets[2] = {small[0].get(), small[1].get()};
+    if (lmk::image::ResizeEach(image, targets, 2) != 0) {
+        CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuResize");
+        return false;
+    }
+    *first = std::move(small[0]);
+    *second = std::move(small[1]);
+    return true;
 }
 
 MIPlane* CAinterface::CreateMIPlane(const _zbm_Image* image) {
