@@ -3,8 +3,10 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <new>
+#include <type_traits>
 
 #include "common/src/internal/memory.h"
 #include "common/src/internal/ppm.h"
@@ -71,7 +73,7 @@ ImagePlaneT<T>::~ImagePlaneT() {
 
 template <typename T>
 int32_t ImagePlaneT<T>::iReset() {
-    if (owned) delete[] pBuf;
+    if (owned) std::free(pBuf);
     pBuf = nullptr;
     pPixel = nullptr;
     pConstBuf = nullptr;
@@ -100,8 +102,10 @@ int32_t ImagePlaneT<T>::iInit(int32_t w, int32_t h) {
     if (w <= 0 || h <= 0 || !IsFresh()) return IMAGEPLANE_ERR_INIT;
     const int64_t s = (static_cast<int64_t>(w) + 15) / 16 * 16;
     if (s > INT32_MAX || !FitsBuffer<T>(static_cast<int32_t>(s), h)) return IMAGEPLANE_ERR_INIT;
-    // Zeroed, so that a map that a step leaves alone reads the same everywhere.
-    T* buf = new (std::nothrow) T[static_cast<size_t>(s) * static_cast<size_t>(h)]();
+    // Zeroed, so that a map that a step leaves alone reads the same everywhere;
+    // calloc gets large planes as fresh zero pages instead of clearing them.
+    static_assert(std::is_trivially_copyable<T>::value, "plane pixels are plain values");
+    T* buf = static_cast<T*>(std::calloc(static_cast<size_t>(s) * static_cast<size_t>(h), sizeof(T)));
     if (buf == nullptr) {
         iReset();
         return IMAGEPLANE_ERR_INIT;
