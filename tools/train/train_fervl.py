@@ -107,7 +107,7 @@ def capsule_distance(w, h, base, direction, radius, depth):
 def render_finger(rng, background, sharp=False):
     """A finger on the lens: a strongly defocused, almost uniform skin-coloured
     blob entering from a corner or a border and covering 8-45 % of the frame.
-    Returns the photo and the finger mask. With sharp=True the same object is
+    Returns the photo and the finger's opacity (0..1). With sharp=True the same object is
     in focus and textured: a warm object in the scene, which the classifier
     must learn to tell from a finger on the lens."""
     h, w = background.shape[:2]
@@ -154,7 +154,7 @@ def render_finger(rng, background, sharp=False):
     finger += rng.normal(0, rng.uniform(4, 12) if sharp else rng.uniform(0.5, 2.5), finger.shape)
     finger = ndimage.gaussian_filter(finger, (blur * 0.5, blur * 0.5, 0))
     out = background * (1 - alpha[:, :, None]) + finger * alpha[:, :, None]
-    return np.clip(out, 0, 255), alpha >= 0.5
+    return np.clip(out, 0, 255), alpha
 
 
 def write_ppm(path, img):
@@ -203,23 +203,29 @@ def run_patches(tool, folder, reuse=False):
 
 
 def contour_labels(patches, masks, sizes):
-    """1: the outline follows a rendered finger; 0: it does not; -1: unclear."""
+    """1: the outline follows a rendered finger; 0: it does not; -1: unclear.
+    A point follows the finger when it lies within 5 % of the width of the
+    half-opacity line or anywhere in the defocused edge (opacity 0.05-0.95),
+    and is far from it beyond 10 % and outside that edge."""
     keys = np.stack([patches["photo"], patches["scale"], patches["contour"]], 1)
     near = np.zeros(len(keys), bool)
     far = np.zeros(len(keys), bool)
     boundary = {}
     for i, (photo, x, y) in enumerate(zip(patches["photo"], patches["x"], patches["y"])):
-        mask = masks[photo]
-        if mask is None:
+        alpha = masks[photo]
+        if alpha is None:
             far[i] = True
             continue
+        mask = alpha >= 0.5
         if photo not in boundary:
             boundary[photo] = np.where(mask, ndimage.distance_transform_edt(mask),
                                        ndimage.distance_transform_edt(~mask))
         h, w = sizes[photo]
-        d = boundary[photo][min(h - 1, int(y * h)), min(w - 1, int(x * w))]
-        near[i] = d <= 0.05 * w
-        far[i] = d > 0.1 * w
+        row, col = min(h - 1, int(y * h)), min(w - 1, int(x * w))
+        d = boundary[photo][row, col]
+        in_edge = 0.05 <= alpha[row, col] <= 0.95
+        near[i] = d <= 0.05 * w or in_edge
+        far[i] = d > 0.1 * w and not in_edge
     labels = np.full(len(keys), -1)
     if len(keys) == 0:
         return labels
