@@ -98,18 +98,18 @@ train-fervl: build sample-photos
 install: build
 	cmake --install build/default
 
-# Sample photos for `make demo` and the similarity quality check (tools/siml_rank): the demo
-# JPEGs of an npm package, kept under build/cache. Best effort: without them
-# the check is skipped.
-PHOTO_PACKAGE = @vladmandic/face-api@1.7.15
+# Sample photos for `make demo`, the similarity quality check (tools/siml_rank)
+# and the finger training: the demo JPEGs of the face networks' npm package,
+# which configuring fetches into the dependency cache (cmake/LumicorFaceModels.cmake).
+# build/cache/face-api points there, so the package is fetched once.
+FACE_API_VERSION = 1.7.15
+DEPS_CACHE    = $(or $(LUMICOR_DEPS_CACHE),$(HOME)/.cache/lumicor)
 PHOTO_CACHE   = build/cache/face-api
-sample-photos:
-	@if [ -f $(PHOTO_CACHE)/package/demo/sample1.jpg ]; then exit 0; fi; \
-	if ! command -v npm >/dev/null; then echo "npm not found: sample photos not fetched, quality check skipped"; exit 0; fi; \
-	mkdir -p $(PHOTO_CACHE) && cd $(PHOTO_CACHE) && \
-	tgz=$$(npm pack --silent $(PHOTO_PACKAGE) 2>/dev/null | tail -n 1) && [ -f "$$tgz" ] && \
-	tar xzf "$$tgz" --wildcards 'package/demo/*.jpg' && rm -f "$$tgz" || \
-	echo "sample photos could not be fetched: quality check skipped"
+sample-photos: deps
+	@if [ ! -f $(DEPS_CACHE)/face-api-$(FACE_API_VERSION)/package/demo/sample1.jpg ]; then \
+	  cmake --preset default >/dev/null || exit 1; \
+	fi; \
+	mkdir -p build/cache && rm -rf $(PHOTO_CACHE) && ln -s $(DEPS_CACHE)/face-api-$(FACE_API_VERSION) $(PHOTO_CACHE)
 
 clean:
 	rm -rf build

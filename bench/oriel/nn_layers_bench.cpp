@@ -15,11 +15,16 @@ using oriel::nn::KernelChoice;
 using oriel::nn::Pad;
 using oriel::nn::Tensor;
 
+// 0: portable kernels, 1: the best of this processor, 2: the best without AVX-512.
+KernelChoice Choice(int64_t k) {
+    return k == 0 ? KernelChoice::Portable : (k == 1 ? KernelChoice::Best : KernelChoice::NoAvx512);
+}
+
 void BM_Conv(benchmark::State& state) {
     const int size = static_cast<int>(state.range(0)), cin = static_cast<int>(state.range(1));
     const int stride = state.range(5) ? static_cast<int>(state.range(5)) : 1;
     const int cout = static_cast<int>(state.range(2)), k = static_cast<int>(state.range(3));
-    const KernelChoice kc = state.range(4) ? KernelChoice::Best : KernelChoice::Portable;
+    const KernelChoice kc = Choice(state.range(4));
     std::vector<float> wts(static_cast<size_t>(k) * k * cin * ((cout + 7) / 8 * 8) + (cout + 7) / 8 * 8, 0.01f);
     oriel::nn::ConvWeights w;
     w.w = wts.data();
@@ -37,19 +42,23 @@ void BM_Conv(benchmark::State& state) {
     state.counters["GMAC/s"] = benchmark::Counter(static_cast<double>(size) * size * cin * cout * k * k * 1e-9 / (stride * stride),
                                                   benchmark::Counter::kIsIterationInvariantRate);
 }
-// size, cin, cout, kernel, best, stride: a late and an early SSD pointwise
-// layer, a recognition 3x3 layer and the SSD's first layer.
+// size, cin, cout, kernel, kernel choice, stride: a late, the last and an
+// early SSD pointwise layer, a recognition 3x3 layer and the SSD's first
+// layer.
 BENCHMARK(BM_Conv)
     ->Args({22, 512, 512, 1, 0, 1})
     ->Args({22, 512, 512, 1, 1, 1})
+    ->Args({22, 512, 512, 1, 2, 1})
+    ->Args({9, 1024, 1024, 1, 1, 1})
     ->Args({140, 32, 64, 1, 1, 1})
+    ->Args({140, 32, 64, 1, 2, 1})
     ->Args({35, 32, 32, 3, 0, 1})
     ->Args({35, 32, 32, 3, 1, 1})
     ->Args({280, 3, 32, 3, 1, 2});
 
 void BM_Depthwise(benchmark::State& state) {
     const int size = 88, c = 128;
-    const KernelChoice kc = state.range(0) ? KernelChoice::Best : KernelChoice::Portable;
+    const KernelChoice kc = Choice(state.range(0));
     std::vector<float> wts(9 * c + c, 0.01f);
     oriel::nn::DepthwiseWeights w;
     w.w = wts.data();
@@ -64,6 +73,6 @@ void BM_Depthwise(benchmark::State& state) {
     for (size_t i = 0; i < in.Size(); ++i) in.d[i] = 0.5f;
     for (auto _ : state) benchmark::DoNotOptimize(oriel::nn::Depthwise(a, 2, in, w, 1, Pad::Same, Act::Relu6, kc).d);
 }
-BENCHMARK(BM_Depthwise)->Arg(0)->Arg(1);
+BENCHMARK(BM_Depthwise)->Arg(0)->Arg(1)->Arg(2);
 
 }  // namespace

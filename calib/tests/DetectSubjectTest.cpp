@@ -18,6 +18,7 @@
 #include "calib/src/plane/image_plane.h"
 #include "calib/tests/attention_fixtures.h"
 #include "testkit/fault.h"
+#include "testkit/images.h"
 #include "testkit/temp_dir.h"
 
 namespace {
@@ -121,6 +122,26 @@ TEST(DetectSubjectTest, ShrinkSizes) {
         EXPECT_EQ(small->width, r.ew);
         EXPECT_EQ(small->height, r.eh);
         EXPECT_EQ(small->ownsData == 0, r.attached);
+    }
+}
+
+// The pair made at once equals the two images made one by one, attached or
+// reduced.
+TEST(DetectSubjectTest, ShrinkImagesAtOnceEqualOneByOne) {
+    CAinterface ca;
+    const struct {
+        int w, h;
+    } sizes[] = {{1283, 961}, {700, 1500}, {640, 480}, {30, 700}};
+    for (const auto& s : sizes) {
+        SCOPED_TRACE(testing::Message() << s.w << "x" << s.h);
+        const std::vector<uint8_t> px = attention_test::MakePhoto(s.w, s.h);
+        ZbmImagePtr src(ZbiuCreateAttatchData(const_cast<uint8_t*>(px.data()), s.w, s.h, s.w * 3, ZBM_PIXEL_ORDER_RGB));
+        ZbmImagePtr big, small;
+        ASSERT_TRUE(ca.CreateShrinkImages(src.get(), 640, 40, &big, &small));
+        ZbmImagePtr bigAlone(ca.CreateShrinkImage(src.get(), 640)), smallAlone(ca.CreateShrinkImage(src.get(), 40));
+        EXPECT_TRUE(lumicor::test::SameImage(big.get(), bigAlone.get()));
+        EXPECT_TRUE(lumicor::test::SameImage(small.get(), smallAlone.get()));
+        EXPECT_EQ(big->ownsData, bigAlone->ownsData);
     }
 }
 

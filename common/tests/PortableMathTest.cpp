@@ -51,7 +51,7 @@ TEST(PortableMathTest, ExpFMatchesTheCorrectlyRoundedValueAlmostAlways) {
     EXPECT_TRUE(std::isnan(lmk::ExpF(std::nanf(""))));
 }
 
-// The point of these functions: the same bits on every target. The value was
+// The point of these functions: the same bits on every target. The values were
 // recorded on x86-64.
 TEST(PortableMathTest, BitsAreTheSameOnEveryTarget) {
     uint64_t hash = 1469598103934665603ull;
@@ -67,6 +67,19 @@ TEST(PortableMathTest, BitsAreTheSameOnEveryTarget) {
         hash = (hash ^ db) * 1099511628211ull;
     }
     EXPECT_EQ(hash, 0x11071acfbbafa642ull);
+
+    hash = 1469598103934665603ull;
+    for (int i = 1; i < 100000; ++i) {
+        const double t = static_cast<double>(i) * 0.0000731;
+        const double v[3] = {lmk::Log(t * 91.0), lmk::Atan2(std::fmod(t * 37.0, 2.0) - 1.0, 0.5 - t),
+                             lmk::Asin(std::fmod(t, 2.0) - 1.0)};
+        for (double d : v) {
+            uint64_t db;
+            std::memcpy(&db, &d, 8);
+            hash = (hash ^ db) * 1099511628211ull;
+        }
+    }
+    EXPECT_EQ(hash, 0x10f88eea0a7a402eull);
 }
 
 }  // namespace
@@ -81,4 +94,35 @@ TEST(PortableMathTest, LogIsWithinAFewUlpsOverTheRange) {
     EXPECT_EQ(lmk::Log(0.0), -std::numeric_limits<double>::infinity());
     EXPECT_EQ(lmk::Log(std::numeric_limits<double>::infinity()), std::numeric_limits<double>::infinity());
     EXPECT_TRUE(std::isnan(lmk::Log(-1.0)));
+}
+
+// Whole circle, both signs of zero, infinities and NaN, against the C library.
+TEST(PortableMathTest, Atan2AndAsinAgreeWithTheCLibrary) {
+    double worst = 0.0;
+    for (int i = 0; i < 3600; ++i) {
+        const double a = i * 0.001745329 - 3.14159;
+        for (double r : {1e-300, 0.37, 1.0, 5e7}) {
+            const double y = r * std::sin(a), x = r * std::cos(a);
+            worst = std::max(worst, std::fabs(lmk::Atan2(y, x) - std::atan2(y, x)));
+        }
+    }
+    EXPECT_LE(worst, 1e-15);
+    const double inf = std::numeric_limits<double>::infinity();
+    const double cases[][2] = {{0.0, 0.0}, {-0.0, 0.0}, {0.0, -0.0}, {-0.0, -0.0}, {1.0, 0.0}, {-1.0, -0.0},
+                               {inf, 1.0}, {1.0, -inf}, {-1.0, inf}, {inf, inf}, {-inf, -inf}, {0.0, -2.0}};
+    for (const auto& c : cases) {
+        const double want = std::atan2(c[0], c[1]);
+        EXPECT_NEAR(lmk::Atan2(c[0], c[1]), want, 1e-15) << c[0] << "," << c[1];
+        EXPECT_EQ(std::signbit(lmk::Atan2(c[0], c[1])), std::signbit(want)) << c[0] << "," << c[1];
+    }
+    EXPECT_TRUE(std::isnan(lmk::Atan2(std::nan(""), 1.0)));
+    EXPECT_TRUE(std::isnan(lmk::Atan2(1.0, std::nan(""))));
+
+    worst = 0.0;
+    for (double x = -1.0; x <= 1.0; x += 0.000731) worst = std::max(worst, std::fabs(lmk::Asin(x) - std::asin(x)));
+    EXPECT_LE(worst, 1e-15);
+    EXPECT_EQ(lmk::Asin(1.0), std::asin(1.0));
+    EXPECT_EQ(lmk::Asin(-1.0), std::asin(-1.0));
+    EXPECT_TRUE(std::isnan(lmk::Asin(1.0000001)));
+    EXPECT_TRUE(std::isnan(lmk::Asin(std::nan(""))));
 }

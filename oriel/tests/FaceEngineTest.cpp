@@ -218,4 +218,46 @@ TEST(FaceEngineTest, ResultsArePinnedAcrossBuilds) {
     for (int i = 0; i < 16; ++i) EXPECT_NEAR(q[i], kVector[i], 1) << i;
 }
 
+// Pose angles are geometric: the mirror image of a clearly turned face is
+// turned the other way, and of a clearly tilted face tilted the other way.
+// (The landmark network is not exactly mirror-symmetric: the same face and
+// its mirror image differ by up to about 0.35 rad in yaw, so only the signs
+// of clear cases are checked.) A sign or landmark mix-up breaks this.
+TEST(FaceEngineTest, MirroredFacesHaveMirroredPose) {
+    SKIP_WHEN_EMULATED();
+    if (oriel_test::Sample(1).Empty()) GTEST_SKIP() << "sample photos absent";
+    Engine engine(7);
+    int turned = 0, tilted = 0;
+    for (int s = 1; s <= 6; ++s) {
+        const oriel_test::Photo work = oriel_test::Reduce(oriel_test::Sample(s), 640);
+        const std::vector<Oriel_areaInfo> faces = engine.Detect(work);
+        const std::vector<Oriel_areaInfo> mirrored = engine.Detect(oriel_test::Mirror(work));
+        for (const Oriel_areaInfo& f : faces) {
+            // Sample 2's leftmost woman is seen half in profile, her nose to
+            // the image left: turned to her own right.
+            if (s == 2 && f.x + f.width / 2 < 0.25f) {
+                EXPECT_LT(f.yaw, -0.3f);
+                ++turned;
+            }
+            // The person's right eye is the one on the image left of an upright face.
+            EXPECT_LT(f.rightEyeX, f.leftEyeX) << "sample " << s;
+            for (const Oriel_areaInfo& m : mirrored) {
+                if (IoU(f.x, f.y, f.width, f.height, 1.0f - m.x - m.width, m.y, m.width, m.height) < 0.6f) continue;
+                if (std::fabs(f.yaw) > 0.3f) {
+                    EXPECT_LT(m.yaw * f.yaw, 0.0f) << "sample " << s << " yaw " << f.yaw << " mirrored " << m.yaw;
+                    ++turned;
+                }
+                if (std::fabs(f.roll) > 0.15f) {
+                    EXPECT_LT(m.roll * f.roll, 0.0f) << "sample " << s << " roll " << f.roll << " mirrored " << m.roll;
+                    ++tilted;
+                }
+                break;
+            }
+        }
+    }
+    std::printf("%d turned and %d tilted faces compared with their mirror images\n", turned, tilted);
+    EXPECT_GE(turned, 4);
+    EXPECT_GE(tilted, 3);
+}
+
 }  // namespace

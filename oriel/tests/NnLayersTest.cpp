@@ -17,6 +17,7 @@ namespace {
 
 using oriel::nn::Act;
 using oriel::nn::Arena;
+using oriel::nn::KernelChoice;
 using oriel::nn::Pad;
 using oriel::nn::Tensor;
 
@@ -84,10 +85,12 @@ TEST_P(ConvTest, MatchesDirectConvolution) {
     Tensor out = oriel::nn::Conv2D(a, 2, in, w, c.stride, c.pad, c.act);
     ASSERT_EQ(out.h, plan.h);
     ASSERT_EQ(out.w, plan.w);
-    // The portable kernels give the very same values as the widest ones.
+    // Every kernel variant gives the very same values.
     const std::vector<float> best(out.d, out.d + out.Size());
-    Tensor portable = oriel::nn::Conv2D(a, 2, in, w, c.stride, c.pad, c.act, oriel::nn::KernelChoice::Portable);
-    ASSERT_EQ(std::memcmp(best.data(), portable.d, best.size() * sizeof(float)), 0);
+    for (const KernelChoice k : {KernelChoice::Portable, KernelChoice::NoAvx512}) {
+        Tensor other = oriel::nn::Conv2D(a, 2, in, w, c.stride, c.pad, c.act, k);
+        ASSERT_EQ(std::memcmp(best.data(), other.d, best.size() * sizeof(float)), 0) << static_cast<int>(k);
+    }
 
     int ho, top, wo, left;
     oriel::nn::PadFor(c.h, c.k, c.stride, c.pad, &ho, &top);
@@ -119,45 +122,54 @@ INSTANTIATE_TEST_SUITE_P(
                       ConvCase{10, 10, 8, 9, 3, 1, Pad::Same, Act::Leaky},     // padded 3x3
                       ConvCase{15, 15, 3, 8, 7, 2, Pad::Valid, Act::Relu},     // 7x7 stride 2 without padding
                       ConvCase{6, 5, 16, 24, 1, 2, Pad::Same, Act::None},      // strided 1x1 projection
-                      ConvCase{12, 19, 40, 25, 1, 1, Pad::Same, Act::None}));  // many pixels, channel tail
+                      ConvCase{12, 19, 40, 25, 1, 1, Pad::Same, Act::None},    // many pixels, channel tail
+                      ConvCase{7, 11, 300, 52, 1, 1, Pad::Same, Act::Relu6},   // weights past the cache: blocks outer
+                      ConvCase{6, 5, 70, 33, 3, 2, Pad::Same, Act::Relu6}));   // few pixels per row, odd block count
 
 TEST(NnLayersTest, DepthwiseMatchesDirectComputation) {
+    // 37 channels: whole vectors of every width plus a tail; inputs up to 4
+    // so that the clamp at 6 is reached.
     for (int stride = 1; stride <= 2; ++stride) {
-        const int h = 9, w = 6, c = 13;
-        const std::vector<float> input = Random(h * w * c, 4);
-        std::vector<float> wb = Random(9 * c + c, 5);
-        oriel::nn::DepthwiseWeights dw;
-        dw.w = wb.data();
-        dw.b = wb.data() + 9 * c;
-        dw.kh = dw.kw = 3;
-        dw.c = c;
-        Arena a;
-        Tensor in = a.Take(1, h, w, c);
-        oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, Act::Relu6);
-        ASSERT_TRUE(a.Allocate());
-        in = a.Take(1, h, w, c);
-        std::copy(input.begin(), input.end(), in.d);
-        Tensor out = oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, Act::Relu6);
-        const std::vector<float> best(out.d, out.d + out.Size());
-        oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, Act::Relu6, oriel::nn::KernelChoice::Portable);
-        ASSERT_EQ(std::memcmp(best.data(), out.d, best.size() * sizeof(float)), 0);
-        int ho, top, wo, left;
-        oriel::nn::PadFor(h, 3, stride, Pad::Same, &ho, &top);
-        oriel::nn::PadFor(w, 3, stride, Pad::Same, &wo, &left);
-        ASSERT_EQ(out.h, ho);
-        ASSERT_EQ(out.w, wo);
-        for (int oy = 0; oy < ho; ++oy)
-            for (int ox = 0; ox < wo; ++ox)
-                for (int ch = 0; ch < c; ++ch) {
-                    double s = 0;
-                    for (int ky = 0; ky < 3; ++ky)
-                        for (int kx = 0; kx < 3; ++kx) {
-                            const int iy = oy * stride - top + ky, ix = ox * stride - left + kx;
-                            if (iy < 0 || ix < 0 || iy >= h || ix >= w) continue;
-                            s += static_cast<double>(input[(iy * w + ix) * c + ch]) * wb[(ky * 3 + kx) * c + ch];
-                        }
-                    ASSERT_NEAR(out.At(oy, ox)[ch], Activate(s + dw.b[ch], Act::Relu6), 1e-5);
-                }
+        for (const Act act : {Act::Relu6, Act::Leaky}) {
+            const int h = 9, w = 6, c = 37;
+            std::vector<float> input = Random(h * w * c, 4);
+            for (float& v : input) v *= 4.0f;
+            std::vector<float> wb = Random(9 * c + c, 5);
+            oriel::nn::DepthwiseWeights dw;
+            dw.w = wb.data();
+            dw.b = wb.data() + 9 * c;
+            dw.kh = dw.kw = 3;
+            dw.c = c;
+            Arena a;
+            Tensor in = a.Take(1, h, w, c);
+            oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, act);
+            ASSERT_TRUE(a.Allocate());
+            in = a.Take(1, h, w, c);
+            std::copy(input.begin(), input.end(), in.d);
+            Tensor out = oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, act);
+            const std::vector<float> best(out.d, out.d + out.Size());
+            for (const KernelChoice k : {KernelChoice::Portable, KernelChoice::NoAvx512}) {
+                oriel::nn::Depthwise(a, 2, in, dw, stride, Pad::Same, act, k);
+                ASSERT_EQ(std::memcmp(best.data(), out.d, best.size() * sizeof(float)), 0) << static_cast<int>(k);
+            }
+            int ho, top, wo, left;
+            oriel::nn::PadFor(h, 3, stride, Pad::Same, &ho, &top);
+            oriel::nn::PadFor(w, 3, stride, Pad::Same, &wo, &left);
+            ASSERT_EQ(out.h, ho);
+            ASSERT_EQ(out.w, wo);
+            for (int oy = 0; oy < ho; ++oy)
+                for (int ox = 0; ox < wo; ++ox)
+                    for (int ch = 0; ch < c; ++ch) {
+                        double s = 0;
+                        for (int ky = 0; ky < 3; ++ky)
+                            for (int kx = 0; kx < 3; ++kx) {
+                                const int iy = oy * stride - top + ky, ix = ox * stride - left + kx;
+                                if (iy < 0 || ix < 0 || iy >= h || ix >= w) continue;
+                                s += static_cast<double>(input[(iy * w + ix) * c + ch]) * wb[(ky * 3 + kx) * c + ch];
+                            }
+                        ASSERT_NEAR(out.At(oy, ox)[ch], Activate(s + dw.b[ch], act), 1e-4);
+                    }
+        }
     }
 }
 

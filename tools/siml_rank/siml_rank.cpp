@@ -19,6 +19,8 @@
 #include <lumicor/ktsimilarity.h>
 #include <lumicor/zbm_image.h>
 
+#include "photo_io.h"
+
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
@@ -33,27 +35,18 @@ struct Rgb {
     std::vector<uint8_t> pixels;  // RGB, rows back to back
 };
 
-bool DecodeJpeg(const std::vector<uint8_t>& bytes, Rgb* out) {
-    jpeg_decompress_struct cinfo;
-    jpeg_error_mgr err;
-    cinfo.err = jpeg_std_error(&err);
-    jpeg_create_decompress(&cinfo);
-    jpeg_mem_src(&cinfo, bytes.data(), static_cast<unsigned long>(bytes.size()));
-    if (jpeg_read_header(&cinfo, TRUE) != JPEG_HEADER_OK) {
-        jpeg_destroy_decompress(&cinfo);
-        return false;
-    }
-    cinfo.out_color_space = JCS_RGB;
-    jpeg_start_decompress(&cinfo);
-    out->width = static_cast<int>(cinfo.output_width);
-    out->height = static_cast<int>(cinfo.output_height);
-    out->pixels.resize(static_cast<size_t>(out->width) * out->height * 3);
-    while (cinfo.output_scanline < cinfo.output_height) {
-        JSAMPROW row = &out->pixels[static_cast<size_t>(cinfo.output_scanline) * out->width * 3];
-        jpeg_read_scanlines(&cinfo, &row, 1);
-    }
-    jpeg_finish_decompress(&cinfo);
-    jpeg_destroy_decompress(&cinfo);
+// Decodes with the lumicor tool's decoder, which reports corrupt or truncated
+// files instead of letting libjpeg end the process.
+bool DecodeJpeg(const std::vector<uint8_t>& bytes, Rgb* out, std::string* error) {
+    lumicor_tool::Photo photo;
+    if (!lumicor_tool::DecodePhoto(bytes, &photo, error)) return false;
+    const _zbm_Image* im = photo.image.get();
+    out->width = im->width;
+    out->height = im->height;
+    out->pixels.resize(static_cast<size_t>(im->width) * im->height * 3);
+    for (int y = 0; y < im->height; ++y)
+        std::memcpy(&out->pixels[static_cast<size_t>(y) * im->width * 3], im->pData + static_cast<size_t>(y) * im->pitch,
+                    static_cast<size_t>(im->width) * 3);
     return true;
 }
 
@@ -190,20 +183,18 @@ int main(int argc, char** argv) {
     const char* kinds[] = {"re-encoded q50", "resized 50%", "cropped 5%", "brightened 25%"};
     std::vector<Entry> entries;
     for (size_t i = 0; i < files.size(); ++i) {
-        FILE* f = std::fopen((folder + "/" + files[i]).c_str(), "rb");
-        if (!f) continue;
         std::vector<uint8_t> bytes;
-        uint8_t chunk[65536];
-        size_t n;
-        while ((n = std::fread(chunk, 1, sizeof(chunk), f)) > 0) bytes.insert(bytes.end(), chunk, chunk + n);
-        std::fclose(f);
+        std::string error;
         Rgb photo;
-        if (!DecodeJpeg(bytes, &photo)) {
-            std::printf("siml_rank: cannot decode %s\n", files[i].c_str());
+        if (!lumicor_tool::ReadFile(folder + "/" + files[i], &bytes, &error) || !DecodeJpeg(bytes, &photo, &error)) {
+            std::printf("siml_rank: %s: %s\n", files[i].c_str(), error.c_str());
             return 2;
         }
         Rgb copies[4];
-        DecodeJpeg(EncodeJpeg(photo, 50), &copies[0]);
+        if (!DecodeJpeg(EncodeJpeg(photo, 50), &copies[0], &error)) {
+            std::printf("siml_rank: %s re-encoded: %s\n", files[i].c_str(), error.c_str());
+            return 2;
+        }
         Resize(photo, photo.width / 2, photo.height / 2, &copies[1]);
         copies[2] = Crop(photo, 0.05);
         copies[3] = Brighten(photo, 1.25);

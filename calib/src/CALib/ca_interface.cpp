@@ -11,42 +11,15 @@
 #include "calib/src/arrange/va_arrange.h"
 #include "calib/src/attention/visual_attention.h"
 #include "calib/src/plane/image_plane.h"
+#include "common/src/image/resize.h"
 #include "common/src/internal/memory.h"
+#include "common/src/internal/portable_math.h"
 #include <lumicor/lmk.h>
 #include "oriel/src/pixdif/pixdif_detector.h"
 
 namespace {
 
 constexpr double kPi = 3.14159265358979323846;
-
-// atan on [0, 1]: atan(k/8) from a table plus the series of the small rest.
-double Atan01(double t) {
-    static const double kAtanEighths[9] = {0x0.0p+0,
-                                           0x1.fd5ba9aac2f6ep-4,
-                                           0x1.f5b75f92c80ddp-3,
-                                           0x1.6f61941e4def1p-2,
-                                           0x1.dac670561bb4fp-2,
-                                           0x1.1e00babdefeb4p-1,
-                                           0x1.4978fa3269ee1p-1,
-                                           0x1.700a7c5784634p-1,
-                                           0x1.921fb54442d18p-1};
-    const int k = static_cast<int>(t * 8.0 + 0.5);
-    const double c = k / 8.0;
-    const double u = (t - c) / (1.0 + t * c);
-    const double u2 = u * u;
-    double sum = 0.0;
-    for (int n = 21; n >= 3; n -= 2) sum = (sum + ((n / 2) % 2 ? -1.0 : 1.0) / n) * u2;
-    return kAtanEighths[k] + u + u * sum;
-}
-
-// atan2 from IEEE basic operations only, so that every target agrees to the bit.
-double Atan2(double y, double x) {
-    const double ay = std::fabs(y), ax = std::fabs(x);
-    if (ay == 0.0 && ax == 0.0) return std::signbit(x) ? std::copysign(kPi, y) : y;
-    double t = ay <= ax ? Atan01(ay / ax) : kPi / 2 - Atan01(ax / ay);
-    if (std::signbit(x)) t = kPi - t;
-    return std::copysign(t, y);
-}
 
 // Truncation toward zero of a pixel coordinate; non-finite or huge values
 // from the host are held to +-2^24.
@@ -66,21 +39,28 @@ CAinterface::CAinterface() : saliencyMap(nullptr), useFaceInfo(1), debugOutput(0
 
 CAinterface::~CAinterface() { ZbiuDispose(&saliencyMap); }
 
+namespace {
+
+// Size of the copy whose longer side is `size`; true when the image is small
+// enough to be used as it is.
+bool ShrinkSize(const _zbm_Image* image, int32_t size, int32_t* w, int32_t* h) {
+    const float ratio = static_cast<float>(image->height) / static_cast<float>(image->width);
+    if (ratio <= 1.0f) {
+        *w = size;
+        *h = static_cast<int32_t>(std::floor(0.5f + static_cast<float>(size) * ratio));
+        return image->width <= size;
+    }
+    *w = static_cast<int32_t>(std::floor(static_cast<float>(size) / ratio + 0.5f));
+    *h = size;
+    return image->height <= size;
+}
+
+}  // namespace
+
 _zbm_Image* CAinterface::CreateShrinkImage(const _zbm_Image* image, int32_t size) {
     if (image == nullptr) return nullptr;
-    const float ratio = static_cast<float>(image->height) / static_cast<float>(image->width);
     int32_t w, h;
-    bool attach;
-    if (ratio <= 1.0f) {
-        attach = image->width <= size;
-        w = size;
-        h = static_cast<int32_t>(std::floor(0.5f + static_cast<float>(size) * ratio));
-    } else {
-        attach = image->height <= size;
-        w = static_cast<int32_t>(std::floor(static_cast<float>(size) / ratio + 0.5f));
-        h = size;
-    }
-    if (attach) {
+    if (ShrinkSize(image, size, &w, &h)) {
         _zbm_Image* copy = ZbiuCreateAttatchData(image->pData, image->width, image->height, image->pitch, image->order);
         if (copy == nullptr) CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuCreateAttatchData");
         return copy;
@@ -95,6 +75,39 @@ _zbm_Image* CAinterface::CreateShrinkImage(const _zbm_Image* image, int32_t size
         return nullptr;
     }
     return small.release();
+}
+
+bool CAinterface::CreateShrinkImages(const _zbm_Image* image, int32_t size, int32_t secondSize, ZbmImagePtr* first,
+                                     ZbmImagePtr* second) {
+    first->reset();
+    second->reset();
+    if (image == nullptr) return false;
+    int32_t w[2], h[2];
+    const bool attach0 = ShrinkSize(image, size, &w[0], &h[0]);
+    const bool attach1 = ShrinkSize(image, secondSize, &w[1], &h[1]);
+    if (attach0 || attach1) {
+        // At most one reduction: nothing to share.
+        first->reset(CreateShrinkImage(image, size));
+        if (*first) second->reset(CreateShrinkImage(image, secondSize));
+        if (!*second) first->reset();
+        return static_cast<bool>(*second);
+    }
+    ZbmImagePtr small[2];
+    for (int i = 0; i < 2; ++i) {
+        small[i].reset(ZbiuCreate(w[i], h[i], image->order));
+        if (!small[i]) {
+            CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuCreate");
+            return false;
+        }
+    }
+    _zbm_Image* const targets[2] = {small[0].get(), small[1].get()};
+    if (lmk::image::ResizeEach(image, targets, 2) != 0) {
+        CA::ReportFailed("CreateShrinkImage", __LINE__, "ZbiuResize");
+        return false;
+    }
+    *first = std::move(small[0]);
+    *second = std::move(small[1]);
+    return true;
 }
 
 MIPlane* CAinterface::CreateMIPlane(const _zbm_Image* image) {
@@ -161,7 +174,7 @@ int32_t CAinterface::DirectionCode(float roll, float pitch, float yaw) {
     const float b = static_cast<float>(static_cast<double>(pitch) / (kPi / 2));
     const float r = static_cast<float>(std::sqrt(static_cast<double>(a) * a + static_cast<double>(b) * b));
     if (r <= 1.0f / 18.0f) return 0;
-    const float theta = static_cast<float>(Atan2(-static_cast<double>(b), static_cast<double>(a)));
+    const float theta = static_cast<float>(lmk::Atan2(-static_cast<double>(b), static_cast<double>(a)));
     float phi = theta + roll;
     if (phi < -kPi) {
         phi = static_cast<float>(phi + 2 * kPi);

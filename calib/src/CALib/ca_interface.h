@@ -24,6 +24,11 @@ public:
     // Copy whose longer side is at most `size` (an attached record over the
     // same pixels when the image is small enough); null on failure.
     _zbm_Image* CreateShrinkImage(const _zbm_Image* image, int32_t size);
+    // CreateShrinkImage for two sizes at once, giving the same two images;
+    // a photo reduced for both is read once. False (with the failure
+    // printed) when either cannot be made; *first and *second are then empty.
+    bool CreateShrinkImages(const _zbm_Image* image, int32_t size, int32_t secondSize, ZbmImagePtr* first,
+                            ZbmImagePtr* second);
     // RGB plane (chroma format 4) of the image; null on failure.
     MIPlane* CreateMIPlane(const _zbm_Image* image);
     // Faces of the host (when given and useFaceInfo) or the saliency path;

@@ -438,8 +438,9 @@ int ZbiuAdjustToExifOrientation(_zbm_Image*& image, int orientation);
  * reduction of more than 2x in either dimension first halves both
  * dimensions ((n + 1) / 2), again while a whole-number ratio to the target
  * is above 2, and finishes with one of the previous rules. src may be an
- * attached image with a negative pitch. Returns 0, 3 for invalid, identical
- * or mismatching images, 4 out of memory. */
+ * attached image with a negative pitch; dst must not share pixel memory
+ * with src (rows are written while later source rows are still being read).
+ * Returns 0, 3 for invalid, identical or mismatching images, 4 out of memory. */
 int ZbiuResize(const _zbm_Image* src, _zbm_Image* dst);
 
 /* Converts src into dst (same width and height) between pixel orders:

@@ -1,5 +1,6 @@
 #include "common/src/internal/portable_math.h"
 
+#include <cmath>
 #include <cstdint>
 #include <cstring>
 #include <limits>
@@ -80,6 +81,53 @@ double Exp(double x) {
     if (m >= -1022) return y * Pow2(m);
     // Subnormal result: scale in two steps so that no step leaves the normal range early.
     return (y * Pow2(m + 960)) * Pow2(-960);
+}
+
+namespace {
+
+constexpr double kPi = 3.14159265358979323846;
+
+// atan on [0, 1]: atan(k/8) from a table plus the series of the small rest
+// (|u| <= 1/16 after the addition formula, so eleven terms reach double precision).
+double Atan01(double t) {
+    static const double kAtanEighths[9] = {0x0.0p+0,
+                                           0x1.fd5ba9aac2f6ep-4,
+                                           0x1.f5b75f92c80ddp-3,
+                                           0x1.6f61941e4def1p-2,
+                                           0x1.dac670561bb4fp-2,
+                                           0x1.1e00babdefeb4p-1,
+                                           0x1.4978fa3269ee1p-1,
+                                           0x1.700a7c5784634p-1,
+                                           0x1.921fb54442d18p-1};
+    const int k = static_cast<int>(t * 8.0 + 0.5);
+    const double c = k / 8.0;
+    const double u = (t - c) / (1.0 + t * c);
+    const double u2 = u * u;
+    double sum = 0.0;
+    for (int n = 21; n >= 3; n -= 2) sum = (sum + ((n / 2) % 2 ? -1.0 : 1.0) / n) * u2;
+    return kAtanEighths[k] + u + u * sum;
+}
+
+}  // namespace
+
+double Atan2(double y, double x) {
+    if (x != x || y != y) return std::numeric_limits<double>::quiet_NaN();
+    const double ay = std::fabs(y), ax = std::fabs(x);
+    if (ay == 0.0 && ax == 0.0) return std::signbit(x) ? std::copysign(kPi, y) : y;
+    double t;
+    if (std::isinf(ay) && std::isinf(ax)) {
+        t = kPi / 4;
+    } else {
+        t = ay <= ax ? Atan01(ay / ax) : kPi / 2 - Atan01(ax / ay);
+    }
+    if (std::signbit(x)) t = kPi - t;
+    return std::copysign(t, y);
+}
+
+double Asin(double x) {
+    if (!(x >= -1.0 && x <= 1.0)) return std::numeric_limits<double>::quiet_NaN();
+    // sqrt is exactly rounded everywhere, so the whole path is portable.
+    return Atan2(x, std::sqrt((1.0 - x) * (1.0 + x)));
 }
 
 double Log(double x) {

@@ -36,6 +36,13 @@ double Exp(double x);
 // for 0, +inf for +inf. Subnormal arguments are scaled into the normal range.
 double Log(double x);
 
+// atan2(y, x) in radians within about 2 ulps, with the C library's signs
+// for zeros and infinities; NaN when either argument is NaN.
+double Atan2(double y, double x);
+
+// asin(x) in radians within about 2 ulps; NaN outside [-1, 1] and for NaN.
+double Asin(double x);
+
 // e^x for float arguments, evaluated in double with a relative error below
 // 4e-11 before the one rounding to float; NaN for NaN, +inf and 0 beyond the
 // float range. Inline: it sits in the innermost loops of the framing search.

@@ -232,7 +232,7 @@ int Cohen::Initialize(const unsigned char* pixels, int32_t width, int32_t height
     height_ = height;
     // Levels from the shorter side, in single precision as the scores were tuned with.
     const float shorter = static_cast<float>(std::min(width, height));
-    levels_ = static_cast<int32_t>(std::log(shorter) / 0.6931472f);
+    levels_ = static_cast<int32_t>(static_cast<float>(lmk::Log(shorter)) / 0.6931472f);
     if (levels_ > kMaxLevels) levels_ = kMaxLevels;
     int32_t w = width, h = height;
     for (int32_t k = 0; k < levels_; ++k) {

@@ -7,6 +7,7 @@
 #include <lumicor/zbm_image.h>
 
 #include "common/src/internal/memory.h"
+#include "common/src/internal/portable_math.h"
 
 namespace oriel {
 
@@ -434,17 +435,21 @@ void FaceEngine::FillParts(const nn::ImageView& img, const Landmarks& lm, Oriel_
         f->part2Y = (my - by) / bh;
     }
     f->partLevels = 2;
-    const float roll = std::atan2(ly - ry, lx - rx);
-    f->roll = roll;
-    const float ux = std::cos(roll), uy = std::sin(roll);
+    // The angles go into stored metas: portable atan2 and asin, and the eye
+    // line's direction from the vector itself, so every device agrees.
+    const float eyeDx = lx - rx, eyeDy = ly - ry;
+    f->roll = static_cast<float>(lmk::Atan2(eyeDy, eyeDx));
+    const float eyeLen = std::sqrt(eyeDx * eyeDx + eyeDy * eyeDy);
+    const float ux = eyeLen > 0.0f ? eyeDx / eyeLen : 1.0f, uy = eyeLen > 0.0f ? eyeDy / eyeLen : 0.0f;
     const float dl = (nx - lm.x[0]) * ux + (ny - lm.y[0]) * uy;
     const float dr = (lm.x[16] - nx) * ux + (lm.y[16] - ny) * uy;
-    f->yaw = (dl + dr) > 0.0f ? std::asin(Clamp((dl - dr) / (dl + dr), -1.0f, 1.0f)) : 0.0f;
+    f->yaw = (dl + dr) > 0.0f ? static_cast<float>(lmk::Asin(Clamp((dl - dr) / (dl + dr), -1.0f, 1.0f))) : 0.0f;
     const float ex = (rx + lx) / 2.0f, ey = (ry + ly) / 2.0f;
     const float vx = -uy, vy = ux;
     const float noseDown = (nx - ex) * vx + (ny - ey) * vy;
     const float mouthDown = (mx - ex) * vx + (my - ey) * vy;
-    f->pitch = mouthDown > 0.0f ? std::asin(Clamp(2.0f * (0.55f - noseDown / mouthDown), -1.0f, 1.0f)) : 0.0f;
+    f->pitch = mouthDown > 0.0f ? static_cast<float>(lmk::Asin(Clamp(2.0f * (0.55f - noseDown / mouthDown), -1.0f, 1.0f)))
+                                : 0.0f;
 }
 
 bool FaceEngine::LocateParts(const nn::ImageView& img, Oriel_areaInfo* face) {
@@ -482,7 +487,7 @@ bool FaceEngine::Expressions(const nn::ImageView& img, const Landmarks& lm, floa
     for (int i = 1; i < 7; ++i) mx = std::fmax(mx, logits[i]);
     float sum = 0.0f;
     for (int i = 0; i < 7; ++i) {
-        probs[i] = std::exp(logits[i] - mx);
+        probs[i] = lmk::ExpF(logits[i] - mx);
         sum += probs[i];
     }
     for (int i = 0; i < 7; ++i) probs[i] /= sum;

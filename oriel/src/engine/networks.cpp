@@ -4,6 +4,8 @@
 #include <cstdio>
 #include <cstring>
 
+#include "common/src/internal/portable_math.h"
+
 namespace oriel {
 
 using nn::Act;
@@ -219,8 +221,8 @@ bool TinyDetector::Detect(const nn::ImageView& img, const nn::Crop& crop, int in
                 if (!(score > minScore)) continue;
                 const float cx = (col + nn::Sigmoid(e[0])) / cells * corrX;
                 const float cy = (row + nn::Sigmoid(e[1])) / cells * corrY;
-                const float w = std::exp(e[2]) * kAnchors[k][0] / cells * corrX;
-                const float h = std::exp(e[3]) * kAnchors[k][1] / cells * corrY;
+                const float w = lmk::ExpF(e[2]) * kAnchors[k][0] / cells * corrX;
+                const float h = lmk::ExpF(e[3]) * kAnchors[k][1] / cells * corrY;
                 nn::Candidate& c = cand[n++];
                 c.box.xmin = cx - w / 2;
                 c.box.ymin = cy - h / 2;
@@ -383,7 +385,7 @@ bool AgeNet::Run(const nn::ImageView& img, const nn::Crop& crop, float* age, flo
     nn::Dense(pooled, fcGender_, g);
     // Softmax of the two gender logits.
     const float mx = g[0] > g[1] ? g[0] : g[1];
-    const float e0 = std::exp(g[0] - mx), e1 = std::exp(g[1] - mx);
+    const float e0 = lmk::ExpF(g[0] - mx), e1 = lmk::ExpF(g[1] - mx);
     *male = e0 / (e0 + e1);
     return true;
 }

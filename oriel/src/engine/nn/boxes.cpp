@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "common/src/internal/portable_math.h"
+
 namespace oriel {
 namespace nn {
 
@@ -72,8 +74,8 @@ Box SsdDecode(const float* anchor, const float* enc) {
     const float aw = anchor[3] - anchor[1];
     const float cy = anchor[0] + ah / 2.0f;
     const float cx = anchor[1] + aw / 2.0f;
-    const float hh = std::exp(enc[2] / 5.0f) * ah / 2.0f;
-    const float hw = std::exp(enc[3] / 5.0f) * aw / 2.0f;
+    const float hh = lmk::ExpF(enc[2] / 5.0f) * ah / 2.0f;
+    const float hw = lmk::ExpF(enc[3] / 5.0f) * aw / 2.0f;
     const float y = enc[0] / 10.0f * ah + cy;
     const float x = enc[1] / 10.0f * aw + cx;
     Box b;
@@ -84,7 +86,7 @@ Box SsdDecode(const float* anchor, const float* enc) {
     return b;
 }
 
-float Sigmoid(float x) { return 1.0f / (1.0f + std::exp(-x)); }
+float Sigmoid(float x) { return 1.0f / (1.0f + lmk::ExpF(-x)); }
 
 float IoU(const Box& a, const Box& b) {
     const float ay0 = std::min(a.ymin, a.ymax), ay1 = std::max(a.ymin, a.ymax);

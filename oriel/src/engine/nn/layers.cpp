@@ -204,6 +204,63 @@ ORIEL_INLINE void ConvLoops(const ConvJob& j) {
     }
 }
 
+// Kernels over two blocks of output channels at once (K::RunStore with
+// the weights of both): Q output pixels from pixel index q0 (row-major
+// over the whole output, so that groups run on across rows), output
+// channels [8 cb, 8 cb + 16). A last odd block is computed twice; only
+// its own outputs are stored.
+template <class K, int Q>
+ORIEL_INLINE void ConvPairGroup(const ConvJob& j, int cb, int q0) {
+    const ConvWeights& w = *j.w;
+    const size_t blockFloats = static_cast<size_t>(w.kh) * w.kw * w.cin * kBlock;
+    const float* w0 = w.w + static_cast<size_t>(cb) * blockFloats;
+    const int left = w.cout - cb * kBlock;
+    const float* w1 = left > kBlock ? w0 + blockFloats : w0;
+    const int n = left < 2 * kBlock ? left : 2 * kBlock;
+    const float* x[Q];
+    float* o[Q];
+    int oy = q0 / j.wo, ox = q0 - oy * j.wo;
+    for (int k = 0; k < Q; ++k) {
+        x[k] = j.flat ? j.src + static_cast<size_t>(q0 + k) * j.cin
+                      : j.src + static_cast<size_t>(oy) * j.stride * j.rowStep +
+                            static_cast<size_t>(ox) * j.stride * j.cin;
+        o[k] = j.out + static_cast<size_t>(q0 + k) * w.cout + cb * kBlock;
+        if (++ox == j.wo) {
+            ox = 0;
+            ++oy;
+        }
+    }
+    K::template RunStore<Q>(x, j.rowStep, w.kh, w.kw, j.cin, w0, w1, w.b + cb * kBlock, n, j.act, o);
+}
+
+// Pixels [q0, q1) in groups of P, the rest in groups of 8, 4, 2 and 1 (a
+// single accumulator would wait on each add in turn).
+template <class K, int P>
+ORIEL_INLINE void ConvPairRange(const ConvJob& j, int cb, int q0, int q1) {
+    int q = q0;
+    for (; q + P <= q1; q += P) ConvPairGroup<K, P>(j, cb, q);
+    if (q + 8 <= q1) ConvPairGroup<K, 8>(j, cb, q), q += 8;
+    if (q + 4 <= q1) ConvPairGroup<K, 4>(j, cb, q), q += 4;
+    if (q + 2 <= q1) ConvPairGroup<K, 2>(j, cb, q), q += 2;
+    if (q < q1) ConvPairGroup<K, 1>(j, cb, q);
+}
+
+// Loop order as in ConvLoops.
+template <class K, int P>
+ORIEL_INLINE void ConvPairLoops(const ConvJob& j) {
+    const ConvWeights& w = *j.w;
+    const int blocks = (w.cout + kBlock - 1) / kBlock;
+    const int total = j.ho * j.wo;
+    const size_t weightBytes = static_cast<size_t>(blocks) * w.kh * w.kw * w.cin * kBlock * sizeof(float);
+    if (weightBytes <= 64 * 1024) {
+        for (int q = 0; q < total; q += P) {
+            const int end = total - q < P ? total : q + P;
+            for (int cb = 0; cb < blocks; cb += 2) ConvPairRange<K, P>(j, cb, q, end);
+        }
+        return;
+    }
+    for (int cb = 0; cb < blocks; cb += 2) ConvPairRange<K, P>(j, cb, 0, total);
+}
 struct DepthwiseJob {
     const float* src;  // the unpadded input
     size_t rowStep;
@@ -230,7 +287,8 @@ ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
             float* o = j.out + (static_cast<size_t>(oy) * j.wo + ox) * c;
             if (iy0 >= 0 && ix0 >= 0 && iy0 + w.kh <= j.inH && ix0 + w.kw <= j.inW) {
                 const float* base = j.src + static_cast<size_t>(iy0) * j.rowStep + static_cast<size_t>(ix0) * c;
-                for (int ch = 0; ch < cv; ch += K::kWidth) K::Run(base + ch, j.rowStep, c, w.w + ch, w.kh, w.kw, o + ch);
+                for (int ch = 0; ch < cv; ch += K::kWidth)
+                    K::Run(base + ch, j.rowStep, c, w.w + ch, w.kh, w.kw, w.b + ch, j.act, o + ch);
                 for (int ch = cv; ch < c; ++ch) {
                     float acc = 0.0f;
                     for (int ky = 0; ky < w.kh; ++ky)
@@ -239,6 +297,7 @@ ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
                                    w.w[(static_cast<size_t>(ky) * w.kw + kx) * c + ch];
                     o[ch] = acc;
                 }
+                BiasActivate(o + cv, w.b + cv, c - cv, j.act);
             } else {
                 for (int ch = 0; ch < c; ++ch) o[ch] = 0.0f;
                 for (int ky = 0; ky < w.kh; ++ky) {
@@ -252,21 +311,23 @@ ORIEL_INLINE void DepthwiseLoops(const DepthwiseJob& j) {
                         for (int ch = 0; ch < c; ++ch) o[ch] += x[ch] * wt[ch];
                     }
                 }
+                BiasActivate(o, w.b, c, j.act);
             }
-            BiasActivate(o, w.b, c, j.act);
         }
     }
 }
 
 struct PortableDepthwise {
     static const int kWidth = 4;
-    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw, float* out) {
+    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw,
+                                 const float* bias, Act act, float* out) {
         typedef Vec<4> V;
         V::T acc = V::Splat(0.0f);
         for (int ky = 0; ky < kh; ++ky)
             for (int kx = 0; kx < kw; ++kx)
                 acc += V::Load(x + ky * rowStep + static_cast<size_t>(kx) * c) * V::Load(w + (static_cast<size_t>(ky) * kw + kx) * c);
         V::Store(out, acc);
+        BiasActivate(out, bias, kWidth, act);
     }
 };
 
@@ -274,6 +335,19 @@ void ConvPortable(const ConvJob& j) { ConvLoops<Stored<PortableKernel>, 4>(j); }
 void DepthwisePortable(const DepthwiseJob& j) { DepthwiseLoops<PortableDepthwise>(j); }
 
 #if defined(__x86_64__) || defined(__i386__)
+// The values of BiasActivate (max and min return the zero or six where its
+// comparisons pick them).
+__attribute__((target("avx2"))) inline __m256 Avx2Activate(__m256 v, Act act) {
+    const __m256 zero = _mm256_setzero_ps();
+    switch (act) {
+        case Act::Relu: return _mm256_max_ps(v, zero);
+        case Act::Relu6: return _mm256_min_ps(_mm256_max_ps(v, zero), _mm256_set1_ps(6.0f));
+        case Act::Leaky:
+            return _mm256_blendv_ps(_mm256_mul_ps(v, _mm256_set1_ps(0.1f)), v, _mm256_cmp_ps(v, zero, _CMP_GT_OQ));
+        case Act::None:
+        default: return v;
+    }
+}
 // Eight-float AVX2 variants, chosen at run time; same values as above.
 // One 8-float register per block of output channels, the input values
 // broadcast from memory; multiply and add stay separate instructions.
@@ -299,27 +373,16 @@ struct Avx2Kernel {
         }
         for (int p = 0; p < P; ++p) _mm256_storeu_ps(out[p], acc[p]);
     }
-    // Bias and activation on the registers (the same values as
-    // BiasActivate: max/min return the zero or six where the comparisons
-    // there pick them).
+    // Bias and activation on the registers.
     template <int P>
     static __attribute__((target("avx2"))) inline void RunStore(const float* const* x, size_t rowStep, int kh, int kw,
                                                                 int cin, const float* w, const float* bias, int n,
                                                                 Act act, float* const* out) {
         float acc[P][kBlock];
         Run<P>(x, rowStep, kh, kw, cin, w, acc);
-        const __m256 b = _mm256_loadu_ps(bias), zero = _mm256_setzero_ps();
+        const __m256 b = _mm256_loadu_ps(bias);
         for (int p = 0; p < P; ++p) {
-            __m256 v = _mm256_add_ps(_mm256_loadu_ps(acc[p]), b);
-            switch (act) {
-                case Act::Relu: v = _mm256_max_ps(v, zero); break;
-                case Act::Relu6: v = _mm256_min_ps(_mm256_max_ps(v, zero), _mm256_set1_ps(6.0f)); break;
-                case Act::Leaky:
-                    v = _mm256_blendv_ps(_mm256_mul_ps(v, _mm256_set1_ps(0.1f)), v, _mm256_cmp_ps(v, zero, _CMP_GT_OQ));
-                    break;
-                case Act::None:
-                default: break;
-            }
+            const __m256 v = Avx2Activate(_mm256_add_ps(_mm256_loadu_ps(acc[p]), b), act);
             if (n == kBlock) {
                 _mm256_storeu_ps(out[p], v);
             } else {
@@ -334,17 +397,111 @@ __attribute__((target("avx2"), flatten)) void ConvWide(const ConvJob& j) { ConvL
 struct Avx2Depthwise {
     static const int kWidth = 8;
     static __attribute__((target("avx2"))) inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh,
-                                                           int kw, float* out) {
+                                                           int kw, const float* bias, Act act, float* out) {
         __m256 acc = _mm256_setzero_ps();
-        for (int ky = 0; ky < kh; ++ky)
-            for (int kx = 0; kx < kw; ++kx)
-                acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + static_cast<size_t>(kx) * c),
-                                                       _mm256_loadu_ps(w + (static_cast<size_t>(ky) * kw + kx) * c)));
-        _mm256_storeu_ps(out, acc);
+        const size_t cs = static_cast<size_t>(c);
+        if (kh == 3 && kw == 3) {
+            // The common case, unrolled.
+            for (int ky = 0; ky < 3; ++ky)
+                for (int kx = 0; kx < 3; ++kx)
+                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm256_loadu_ps(w + (ky * 3 + kx) * cs)));
+        } else {
+            for (int ky = 0; ky < kh; ++ky)
+                for (int kx = 0; kx < kw; ++kx)
+                    acc = _mm256_add_ps(acc, _mm256_mul_ps(_mm256_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm256_loadu_ps(w + (ky * kw + kx) * cs)));
+        }
+        _mm256_storeu_ps(out, Avx2Activate(_mm256_add_ps(acc, _mm256_loadu_ps(bias)), act));
     }
 };
 __attribute__((target("avx2"), flatten)) void DepthwiseWide(const DepthwiseJob& j) { DepthwiseLoops<Avx2Depthwise>(j); }
 bool UseWide(KernelChoice k) { return k != KernelChoice::Portable && __builtin_cpu_supports("avx2"); }
+
+// Sixteen-float AVX-512 variant: one register holds two blocks of 8 output
+// channels, each output still summed over taps and input channels in the
+// same order, multiply and add separate.
+#define ORIEL_AVX512 __attribute__((target("avx512f,avx512dq")))
+// BiasActivate's comparisons on 16 lanes.
+ORIEL_AVX512 inline __m512 Avx512Activate(__m512 v, Act act) {
+    const __m512 zero = _mm512_setzero_ps();
+    switch (act) {
+        case Act::Relu: return _mm512_maskz_mov_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), v);
+        case Act::Relu6: {
+            const __m512 six = _mm512_set1_ps(6.0f);
+            const __m512 t = _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, six, _CMP_LT_OQ), six, v);
+            return _mm512_maskz_mov_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), t);
+        }
+        case Act::Leaky:
+            return _mm512_mask_blend_ps(_mm512_cmp_ps_mask(v, zero, _CMP_GT_OQ), _mm512_mul_ps(v, _mm512_set1_ps(0.1f)),
+                                        v);
+        case Act::None:
+        default: return v;
+    }
+}
+struct Avx512Kernel {
+    // Q pixels, output channels of blocks cb and cb + 1 (w0, w1 their weights).
+    template <int Q>
+    static ORIEL_AVX512 inline void RunStore(const float* const* x, size_t rowStep, int kh, int kw, int cin,
+                                             const float* w0, const float* w1, const float* bias, int n, Act act,
+                                             float* const* out) {
+        __m512 acc[Q];
+        for (int p = 0; p < Q; ++p) acc[p] = _mm512_setzero_ps();
+        for (int ky = 0; ky < kh; ++ky) {
+            for (int kx = 0; kx < kw; ++kx) {
+                const size_t tap = ky * rowStep + static_cast<size_t>(kx) * cin;
+                const size_t woff = (static_cast<size_t>(ky) * kw + kx) * cin * kBlock;
+                const float* wa = w0 + woff;
+                const float* wb = w1 + woff;
+                const float* xp[Q];
+                for (int p = 0; p < Q; ++p) xp[p] = x[p] + tap;
+                for (int ci = 0; ci < cin; ++ci, wa += kBlock, wb += kBlock) {
+                    const __m512 wt =
+                        _mm512_insertf32x8(_mm512_castps256_ps512(_mm256_loadu_ps(wa)), _mm256_loadu_ps(wb), 1);
+                    for (int p = 0; p < Q; ++p)
+                        acc[p] = _mm512_add_ps(acc[p], _mm512_mul_ps(_mm512_set1_ps(xp[p][ci]), wt));
+                }
+            }
+        }
+        // The bias of an odd last block has 8 floats only.
+        const __mmask16 keep = static_cast<__mmask16>(n >= 16 ? 0xFFFFu : ((1u << n) - 1u));
+        const __m512 b = _mm512_maskz_loadu_ps(keep, bias);
+        for (int p = 0; p < Q; ++p) {
+            const __m512 v = Avx512Activate(_mm512_add_ps(acc[p], b), act);
+            _mm512_mask_storeu_ps(out[p], keep, v);
+        }
+    }
+};
+
+struct Avx512Depthwise {
+    static const int kWidth = 16;
+    static ORIEL_AVX512 inline void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw,
+                                        const float* bias, Act act, float* out) {
+        __m512 acc = _mm512_setzero_ps();
+        const size_t cs = static_cast<size_t>(c);
+        if (kh == 3 && kw == 3) {
+            for (int ky = 0; ky < 3; ++ky)
+                for (int kx = 0; kx < 3; ++kx)
+                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm512_loadu_ps(w + (ky * 3 + kx) * cs)));
+        } else {
+            for (int ky = 0; ky < kh; ++ky)
+                for (int kx = 0; kx < kw; ++kx)
+                    acc = _mm512_add_ps(acc, _mm512_mul_ps(_mm512_loadu_ps(x + ky * rowStep + kx * cs),
+                                                           _mm512_loadu_ps(w + (ky * kw + kx) * cs)));
+        }
+        _mm512_storeu_ps(out, Avx512Activate(_mm512_add_ps(acc, _mm512_loadu_ps(bias)), act));
+    }
+};
+__attribute__((target("avx512f,avx512dq"), flatten)) void DepthwiseWidest(const DepthwiseJob& j) {
+    DepthwiseLoops<Avx512Depthwise>(j);
+}
+__attribute__((target("avx512f,avx512dq"), flatten)) void ConvWidest(const ConvJob& j) {
+    ConvPairLoops<Avx512Kernel, 16>(j);
+}
+bool UseWidest(KernelChoice k) {
+    return k == KernelChoice::Best && __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512dq");
+}
 #elif defined(__ARM_NEON)
 // 32-bit ARM: the compiler keeps generic float vectors on the (IEEE) VFP
 // unit, one lane at a time, because NEON flushes subnormal numbers to zero.
@@ -381,13 +538,15 @@ struct NeonKernel {
 };
 struct NeonDepthwise {
     static const int kWidth = 4;
-    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw, float* out) {
+    static ORIEL_INLINE void Run(const float* x, size_t rowStep, int c, const float* w, int kh, int kw,
+                                 const float* bias, Act act, float* out) {
         float32x4_t acc = vdupq_n_f32(0.0f);
         for (int ky = 0; ky < kh; ++ky)
             for (int kx = 0; kx < kw; ++kx)
                 acc = vaddq_f32(acc, vmulq_f32(vld1q_f32(x + ky * rowStep + static_cast<size_t>(kx) * c),
                                                vld1q_f32(w + (static_cast<size_t>(ky) * kw + kx) * c)));
         vst1q_f32(out, acc);
+        BiasActivate(out, bias, kWidth, act);
     }
 };
 void ConvWide(const ConvJob& j) { ConvLoops<Stored<NeonKernel>, 4>(j); }
@@ -447,6 +606,12 @@ Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int st
     job.w = &w;
     job.out = out.d;
     job.act = act;
+#if defined(__x86_64__) || defined(__i386__)
+    if (UseWidest(kernels)) {
+        ConvWidest(job);
+        return out;
+    }
+#endif
     if (UseWide(kernels))
         ConvWide(job);
     else
@@ -475,6 +640,12 @@ Tensor Depthwise(Arena& a, int slot, const Tensor& in, const DepthwiseWeights& w
     job.w = &w;
     job.out = out.d;
     job.act = act;
+#if defined(__x86_64__) || defined(__i386__)
+    if (UseWidest(kernels)) {
+        DepthwiseWidest(job);
+        return out;
+    }
+#endif
     if (UseWide(kernels))
         DepthwiseWide(job);
     else

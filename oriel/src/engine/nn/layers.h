@@ -23,11 +23,12 @@ enum class Pad { Same, Valid };
 // Output size and leading padding of one axis.
 void PadFor(int in, int k, int stride, Pad pad, int* out, int* before);
 
-// Kernel variants: Best picks the widest vectors the processor has (AVX2
-// on x86-64 when present, NEON on ARM); Portable forces the generic
-// 4-float kernels. They give identical results, except that NEON treats
-// subnormal values (below 1.2e-38) as 0.
-enum class KernelChoice { Best, Portable };
+// Kernel variants: Best picks the widest vectors the processor has
+// (AVX-512 or AVX2 on x86-64 when present, NEON on ARM); Portable forces
+// the generic 4-float kernels; NoAvx512 is Best without the AVX-512
+// kernels. They give identical results, except that NEON treats subnormal
+// values (below 1.2e-38) as 0.
+enum class KernelChoice { Best, Portable, NoAvx512 };
 
 Tensor Conv2D(Arena& a, int slot, const Tensor& in, const ConvWeights& w, int stride, Pad pad, Act act,
               KernelChoice kernels = KernelChoice::Best);
