@@ -11,7 +11,8 @@ DEB_PACKAGES  = cmake make g++ ccache pkg-config googletest libgtest-dev libbenc
 
 # Training the finger-on-lens patch dictionaries (tools/train/README.md);
 # npm comes with the machine's Node.js.
-TRAIN_DEB_PACKAGES = python3-numpy python3-scipy python3-sklearn python3-skimage python3-pil
+TRAIN_DEB_PACKAGES = python3-numpy python3-scipy python3-sklearn python3-skimage python3-pil \
+                     python-matplotlib-data mate-backgrounds
 
 .PHONY: all deps build test demo fuzz bench parity install clean sample-photos train-fervl
 

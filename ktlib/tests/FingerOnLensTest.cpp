@@ -36,8 +36,9 @@ Finger Square(float x0, float y0, float x1, float y1, float score) {
     return f;
 }
 
-// A smooth, softly shaded skin-coloured finger entering from the left over a
-// textured background (what a finger on the lens looks like at 80 x 60).
+// A finger on the lens at 80 x 60: a large, strongly defocused, softly
+// shaded skin-coloured blob entering from the left over a textured
+// background, its edge fading over a sixth of the picture height.
 ZbmImagePtr FingerPhoto(int32_t w, int32_t h) {
     ZbmImagePtr img = lumicor::test::MakeNoiseImage(w, h, ZBM_PIXEL_ORDER_RGB, 7);
     for (int32_t y = 0; y < h; ++y) {
@@ -46,14 +47,15 @@ ZbmImagePtr FingerPhoto(int32_t w, int32_t h) {
             p[0] = static_cast<uint8_t>(40 + p[0] / 3);
             p[1] = static_cast<uint8_t>(70 + p[1] / 3);
             p[2] = static_cast<uint8_t>(90 + p[2] / 3);
-            const float dy = (y - h * 0.5f) / (h * 0.22f), dx = x / (w * 0.45f);
-            const float d = dy * dy + dx * dx;
-            if (d < 1.4f) {
-                const float a = d < 0.8f ? 1.0f : (1.4f - d) / 0.6f;
-                const float shade = 1.0f - 0.3f * d;
-                const float skin[3] = {225 * shade, 150 * shade, 115 * shade};
-                for (int c = 0; c < 3; ++c) p[c] = static_cast<uint8_t>(a * skin[c] + (1 - a) * p[c]);
-            }
+            const float dy = (y - h * 0.5f) / (h * 0.35f), dx = x / (w * 0.4f);
+            const float r = std::sqrt(dy * dy + dx * dx);
+            const float soft = 0.45f;
+            float a = (1.0f + soft - r) / (2.0f * soft);
+            a = a < 0.0f ? 0.0f : (a > 1.0f ? 1.0f : a);
+            a = a * a * (3.0f - 2.0f * a);
+            const float shade = 1.0f - 0.2f * r * r;
+            const float skin[3] = {225 * shade, 130 * shade, 95 * shade};
+            for (int c = 0; c < 3; ++c) p[c] = static_cast<uint8_t>(a * skin[c] + (1 - a) * p[c]);
         }
     }
     return img;

@@ -154,6 +154,51 @@ TEST(FingerRegionTest, OutlineRunsFromBorderToBorderThroughTheRegion) {
     }
 }
 
+TEST(FingerRegionTest, OutlineTracedPixelByPixel) {
+    // Traced by hand on a 6 x 5 picture: the border walks from the chosen
+    // corners find the two crossings, the start edge sets the first search
+    // direction, and the outline follows the region's inner side.
+    struct Case {
+        zbm_Rect region;
+        std::vector<zbm_Pos> outline;
+    };
+    const Case cases[] = {
+        // Left and bottom: corners (0, 0) and (5, 0); first search upwards.
+        {{0, 2, 3, 3}, {{0, 2}, {1, 2}, {2, 2}, {2, 3}, {2, 4}}},
+        // Top and right, no left: corners (0, 4) and (0, 0); first search down.
+        {{3, 0, 3, 2}, {{5, 1}, {4, 1}, {3, 0}}},
+        // Left and top, no right: corners (5, 0) and (5, 4); first search right.
+        {{0, 0, 3, 2}, {{2, 0}, {2, 1}, {1, 1}, {0, 1}}},
+        // Left, top and right: corners (5, 4) and (0, 4).
+        {{0, 0, 6, 2}, {{5, 1}, {4, 1}, {3, 1}, {2, 1}, {1, 1}, {0, 1}}},
+    };
+    const int32_t w = 6, h = 5;
+    for (const Case& c : cases) {
+        const zbm_Rect& r = c.region;
+        zbmvector<int32_t> labels;
+        labels.Resize(w * h);
+        RegionInfo info = {r.width * r.height, 0, 0, 0, 0, 1, 1};
+        for (int32_t y = r.y; y < r.y + r.height; ++y) {
+            for (int32_t x = r.x; x < r.x + r.width; ++x) {
+                labels[y * w + x] = 1;
+                info.left += x == 0;
+                info.top += y == 0;
+                info.right += x == w - 1;
+                info.bottom += y == h - 1;
+            }
+        }
+        zbmvector<zbm_Pos> contour;
+        ASSERT_EQ(FindContourOfRegion(labels, w, h, 1, info, contour), KT_OK);
+        std::string got, want;
+        for (int32_t i = 0; i < contour.size(); ++i)
+            got += "(" + std::to_string(contour[i].x) + "," + std::to_string(contour[i].y) + ")";
+        for (const zbm_Pos& p : c.outline) want += "(" + std::to_string(p.x) + "," + std::to_string(p.y) + ")";
+        EXPECT_EQ(got, want) << "region at " << r.x << "," << r.y;
+        labels.Clear();
+        contour.Clear();
+    }
+}
+
 TEST(FingerRegionTest, BorderWalksAreInverse) {
     const ImageBound bound(7, 4);
     zbm_Pos p = {0, 0};

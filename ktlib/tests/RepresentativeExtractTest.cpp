@@ -188,6 +188,23 @@ TEST(RepresentativeExtractTest, WorkingResultsAreTheSameOnEveryTarget) {
         for (const FOL::FingerPoint& p : f.points) fingerHash = Fnv(fingerHash, &p, 8);
     }
     EXPECT_EQ(fingerHash, 0x2742a86d16a71628ull) << std::hex << fingerHash;
+
+    // The trained patch classifier: patches along the traced outline, every
+    // turning of both dictionaries.
+    FOL::FeRVLHandler handler;
+    ASSERT_EQ(handler.Initialize(), KT_OK);
+    uint64_t patchHash = 1469598103934665603ull;
+    int32_t scored = 0;
+    for (int32_t i = 0; i < contours[0].size(); ++i) {
+        const zbm_Rect rect = {contours[0][i].x - 5, contours[0][i].y - 5, 10, 10};
+        if (!FOL::ImageBound(small->width, small->height).IsRectInImage(rect)) continue;
+        float value = 0.0f;
+        ASSERT_EQ(handler.EvalImagePatch(small.get(), rect, i % 8, &value), KT_OK);
+        patchHash = Fnv(patchHash, &value, 4);
+        ++scored;
+    }
+    EXPECT_GE(scored, 8) << "too few patches to compare";
+    EXPECT_EQ(patchHash, 0xafd26d3e66397d5aull) << std::hex << patchHash;
     contours.Clear();
     adjusted.Clear();
     fingers.Clear();

@@ -37,18 +37,26 @@ P, S = 5, 2
 RECORD = 7 * 4 + 300
 
 SKIMAGE = "/usr/lib/python3/dist-packages/skimage/data"
+MATE = "/usr/share/backgrounds/mate/nature"                   # Debian's mate-backgrounds
+MPL = "/usr/share/matplotlib/mpl-data/sample_data"             # Debian's python-matplotlib-data
+FOLDERS = {"skimage": SKIMAGE, "mate": MATE, "mpl": MPL}
 # Source photos, split by photo so that held-out photos were never seen.
 TRAIN_PHOTOS = ["skimage:astronaut.png", "skimage:chelsea.png", "skimage:motorcycle_left.png",
                 "skimage:camera.png", "skimage:coins.png", "skimage:grass.png", "skimage:brick.png",
                 "skimage:retina.jpg", "skimage:hubble_deep_field.jpg", "skimage:ihc.png", "skimage:clock_motion.png",
                 "skimage:page.png",
-                "faceapi:sample1.jpg", "faceapi:sample2.jpg", "faceapi:sample3.jpg", "faceapi:sample4.jpg"]
+                "faceapi:sample1.jpg", "faceapi:sample2.jpg", "faceapi:sample3.jpg", "faceapi:sample4.jpg",
+                "mate:Aqua.jpg", "mate:Blinds.jpg", "mate:FreshFlower.jpg", "mate:GreenMeadow.jpg",
+                "mate:RainDrops.jpg", "mate:TwoWings.jpg", "mate:Wood.jpg", "mpl:grace_hopper.jpg"]
 HELDOUT_PHOTOS = ["skimage:coffee.png", "skimage:rocket.jpg", "skimage:motorcycle_right.png",
-                  "skimage:moon.png", "skimage:gravel.png", "faceapi:sample5.jpg", "faceapi:sample6.jpg"]
+                  "skimage:moon.png", "skimage:gravel.png", "faceapi:sample5.jpg", "faceapi:sample6.jpg",
+                  "mate:Dune.jpg", "mate:Garden.jpg", "mate:LadyBird.jpg", "mate:Storm.jpg", "mate:YellowFlower.jpg"]
 
-# Skin tones from dark brown to backlit pink and orange.
+# Skin tones from dark brown to backlit pink and orange; skin lit from behind
+# passes mostly red (blood absorbs green and blue), in shadow it is near black.
 SKIN = np.array([[62, 36, 24], [96, 58, 38], [130, 82, 56], [170, 112, 82], [200, 140, 110],
-                 [226, 176, 150], [240, 150, 120], [252, 132, 96], [250, 170, 120], [236, 112, 92]], float)
+                 [226, 176, 150], [240, 150, 120], [252, 132, 96], [250, 170, 120], [236, 112, 92],
+                 [214, 84, 56], [180, 52, 36], [48, 28, 22]], float)
 
 
 def face_api_dir(root):
@@ -64,7 +72,7 @@ def face_api_dir(root):
 
 def load_photo(root, name):
     kind, file = name.split(":")
-    path = os.path.join(SKIMAGE if kind == "skimage" else face_api_dir(root), file)
+    path = os.path.join(face_api_dir(root) if kind == "faceapi" else FOLDERS[kind], file)
     return np.asarray(Image.open(path).convert("RGB"))
 
 
@@ -83,15 +91,31 @@ def random_crop(rng, photo):
     return np.clip(img, 0, 255)
 
 
+def capsule_distance(w, h, base, direction, radius, depth):
+    """Distance of every pixel to the axis of a capsule that starts 2 radii
+    outside the frame at `base` and reaches `depth` into it, and the position
+    along the axis (0 outside, 1 at the tip)."""
+    start = base - direction * radius * 2
+    tip = base + direction * depth
+    yy, xx = np.mgrid[0:h, 0:w].astype(float)
+    px, py = xx - start[0], yy - start[1]
+    seg = tip - start
+    t = np.clip((px * seg[0] + py * seg[1]) / (seg @ seg), 0, 1)
+    return np.hypot(px - t * seg[0], py - t * seg[1]), t
+
+
 def render_finger(rng, background, sharp=False):
-    """A blurred, smoothly shaded skin-coloured capsule entering from a border
-    or a corner. Returns the photo and the finger mask. With sharp=True the
-    same object is in focus and textured: a warm object in the scene, which
-    the classifier must learn to tell from a finger on the lens."""
+    """A finger on the lens: a strongly defocused, almost uniform skin-coloured
+    blob entering from a corner or a border and covering 8-45 % of the frame.
+    Returns the photo and the finger's opacity (0..1). With sharp=True the same object is
+    in focus and textured: a warm object in the scene, which the classifier
+    must learn to tell from a finger on the lens."""
     h, w = background.shape[:2]
     side = min(w, h)
-    radius = rng.uniform(0.14, 0.34) * side
-    if rng.random() < 0.5:
+    # The fingertip is a few millimetres from a wide-angle lens: its outline
+    # is a large arc, wider than a third of the short side.
+    radius = rng.uniform(0.3, 0.65) * side
+    if rng.random() < 0.6:
         corner = rng.integers(4)
         base = np.array([[0, 0], [w, 0], [w, h], [0, h]][corner], float)
         inward = np.array([[1, 1], [-1, 1], [-1, -1], [1, -1]][corner], float) / np.sqrt(2)
@@ -104,29 +128,33 @@ def render_finger(rng, background, sharp=False):
         spread = 0.5
     angle = np.arctan2(inward[1], inward[0]) + rng.uniform(-spread, spread)
     direction = np.array([np.cos(angle), np.sin(angle)])
-    depth = rng.uniform(0.25, 0.7) * side + radius * 0.3
-    start = base - direction * radius * 2
-    tip = base + direction * depth
-    yy, xx = np.mgrid[0:h, 0:w].astype(float)
-    px, py = xx - start[0], yy - start[1]
-    seg = tip - start
-    t = np.clip((px * seg[0] + py * seg[1]) / (seg @ seg), 0, 1)
-    dist = np.hypot(px - t * seg[0], py - t * seg[1])
+    # The depth that makes the finger cover the drawn share of the frame.
+    share = rng.uniform(0.08, 0.45)
+    low, high = -radius, 1.5 * (w + h)
+    for _ in range(20):
+        depth = 0.5 * (low + high)
+        if (capsule_distance(w, h, base, direction, radius, depth)[0] <= radius).mean() < share:
+            low = depth
+        else:
+            high = depth
+    dist, t = capsule_distance(w, h, base, direction, radius, 0.5 * (low + high))
     mask = dist <= radius
-    # Defocus: the finger is far too close to be sharp.
-    blur = rng.uniform(0.002, 0.012) * side if sharp else rng.uniform(0.03, 0.09) * side
-    alpha = ndimage.gaussian_filter(mask.astype(float), blur)
+    # Defocus: millimetres from the lens, the finger is blurred far beyond
+    # anything else in the photo (sigma 5-15 % of the short side).
+    blur = rng.uniform(0.002, 0.012) * side if sharp else rng.uniform(0.05, 0.15) * side
+    alpha = ndimage.gaussian_filter(mask.astype(float), blur, mode="nearest")
     i, j = rng.integers(len(SKIN), size=2)
     colour = SKIN[i] + (SKIN[j] - SKIN[i]) * rng.random()
     colour = colour * rng.uniform(0.55, 1.15)
-    # Soft vignetted shading across the finger and along it.
+    # Soft shading across the finger and along it; light leaking through the
+    # skin leaves no texture.
     across = np.clip(dist / radius, 0, 1.5)
-    shade = 1.0 - rng.uniform(0.15, 0.5) * across ** 2 + rng.uniform(-0.15, 0.15) * (t - 0.5)
+    shade = 1.0 - rng.uniform(0.1, 0.4) * across ** 2 + rng.uniform(-0.15, 0.15) * (t - 0.5)
     finger = colour[None, None, :] * shade[:, :, None]
     finger += rng.normal(0, rng.uniform(4, 12) if sharp else rng.uniform(0.5, 2.5), finger.shape)
     finger = ndimage.gaussian_filter(finger, (blur * 0.5, blur * 0.5, 0))
     out = background * (1 - alpha[:, :, None]) + finger * alpha[:, :, None]
-    return np.clip(out, 0, 255), alpha >= 0.5
+    return np.clip(out, 0, 255), alpha
 
 
 def write_ppm(path, img):
@@ -175,23 +203,29 @@ def run_patches(tool, folder, reuse=False):
 
 
 def contour_labels(patches, masks, sizes):
-    """1: the outline follows a rendered finger; 0: it does not; -1: unclear."""
+    """1: the outline follows a rendered finger; 0: it does not; -1: unclear.
+    A point follows the finger when it lies within 5 % of the width of the
+    half-opacity line or anywhere in the defocused edge (opacity 0.05-0.95),
+    and is far from it beyond 10 % and outside that edge."""
     keys = np.stack([patches["photo"], patches["scale"], patches["contour"]], 1)
     near = np.zeros(len(keys), bool)
     far = np.zeros(len(keys), bool)
     boundary = {}
     for i, (photo, x, y) in enumerate(zip(patches["photo"], patches["x"], patches["y"])):
-        mask = masks[photo]
-        if mask is None:
+        alpha = masks[photo]
+        if alpha is None:
             far[i] = True
             continue
+        mask = alpha >= 0.5
         if photo not in boundary:
             boundary[photo] = np.where(mask, ndimage.distance_transform_edt(mask),
                                        ndimage.distance_transform_edt(~mask))
         h, w = sizes[photo]
-        d = boundary[photo][min(h - 1, int(y * h)), min(w - 1, int(x * w))]
-        near[i] = d <= 0.05 * w
-        far[i] = d > 0.1 * w
+        row, col = min(h - 1, int(y * h)), min(w - 1, int(x * w))
+        d = boundary[photo][row, col]
+        in_edge = 0.05 <= alpha[row, col] <= 0.95
+        near[i] = d <= 0.05 * w or in_edge
+        far[i] = d > 0.1 * w and not in_edge
     labels = np.full(len(keys), -1)
     if len(keys) == 0:
         return labels
