@@ -2,6 +2,8 @@
 # Seeds live in fuzz/corpus/<name>/; each target also runs a bounded number of
 # iterations as a CTest test so that regressions show up in `make test`.
 set(LUMICOR_FUZZ_RUNS 200000 CACHE STRING "libFuzzer runs per target under ctest")
+# A fixed seed keeps the test runs repeatable; `make fuzz` explores with fresh seeds.
+set(LUMICOR_FUZZ_SEED 1 CACHE STRING "libFuzzer seed of the ctest runs")
 file(GLOB fuzz_sources CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/fuzz/*.cpp)
 foreach(src ${fuzz_sources})
   get_filename_component(name ${src} NAME_WE)
@@ -13,6 +15,6 @@ foreach(src ${fuzz_sources})
   set(work ${PROJECT_BINARY_DIR}/fuzz-work/${name})
   add_test(NAME fuzz.${name}
     COMMAND ${CMAKE_COMMAND} -E env ASAN_OPTIONS=detect_leaks=1
-            sh -c "mkdir -p '${work}' && exec '$<TARGET_FILE:fuzz_${name}>' -runs=${LUMICOR_FUZZ_RUNS} -max_len=65536 -timeout=10 -rss_limit_mb=4096 -print_final_stats=1 '${work}' '${corpus}'")
+            sh -c "mkdir -p '${work}' && exec '$<TARGET_FILE:fuzz_${name}>' -runs=${LUMICOR_FUZZ_RUNS} -seed=${LUMICOR_FUZZ_SEED} -max_len=65536 -timeout=10 -rss_limit_mb=4096 -print_final_stats=1 '${work}' '${corpus}'")
   set_tests_properties(fuzz.${name} PROPERTIES TIMEOUT 1200)
 endforeach()

@@ -48,8 +48,10 @@ void CheckSection(const std::string& module, const std::string& section) {
         Check(!k.empty() && k.find(':') == std::string::npos);
         if (i > 0 && !(keys[i - 1] < k)) ++descents;
         if (k.find('\0') != std::string::npos) continue;  // not reachable through a C string
+        // Two different defaults, as for integers: a stored value may equal one of them.
         const bool isString =
-            LmkConfig::GetValueString(module.c_str(), section.c_str(), k.c_str(), "\x01missing") != "\x01missing";
+            LmkConfig::GetValueString(module.c_str(), section.c_str(), k.c_str(), "\x01missing") != "\x01missing" ||
+            LmkConfig::GetValueString(module.c_str(), section.c_str(), k.c_str(), "\x02" "absent") != "\x02" "absent";
         const bool isInt = LmkConfig::GetValueInt(module.c_str(), section.c_str(), k.c_str(), -7) != -7 ||
                            LmkConfig::GetValueInt(module.c_str(), section.c_str(), k.c_str(), -8) != -8;
         Check(isString || isInt);
