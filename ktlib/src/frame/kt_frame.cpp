@@ -1,49 +1,34 @@
-#include "ktlib/src/frame/kt_handlers.h"
+#include "ktlib/src/frame/kt_fixed_record.h"
 
-#include "common/src/internal/byte_cursor.h"
 #include "common/src/internal/memory.h"
 
 #include <cstring>
 
-unsigned int KtFrameHeaderHandler::Write(unsigned char* buffer, unsigned int length) const {
-    if (!readable_ || !buffer || length < kSize) return 0;
-    lmk::ByteWriter w(buffer, length);
-    w.Bytes(readable_->metaSignature, 4);
-    w.U32(readable_->metaBytes);
-    w.U8(readable_->metaVersion.major);
-    w.U8(readable_->metaVersion.minor);
-    w.U8(readable_->engineVersion.major);
-    w.U8(readable_->engineVersion.minor);
-    w.U32(readable_->engineVersion.build);
-    return w.ok() ? w.position() : 0;
-}
+template <>
+struct KtRecordLayout<KtFrameHeader> {
+    template <class Io, class Header>
+    static void Fields(Io& io, Header& h) {
+        io.Bytes(h.metaSignature, 4);
+        io.U32(h.metaBytes);
+        io.U8(h.metaVersion.major);
+        io.U8(h.metaVersion.minor);
+        io.U8(h.engineVersion.major);
+        io.U8(h.engineVersion.minor);
+        io.U32(h.engineVersion.build);
+    }
 
-unsigned int KtFrameHeaderHandler::Read(const unsigned char* buffer, unsigned int length) {
-    if (!header_ || !buffer || length < kSize) return 0;
-    lmk::ByteReader r(buffer, length);
-    KtFrameHeader h;
-    r.Bytes(h.metaSignature, 4);
-    h.metaBytes = r.U32();
-    h.metaVersion.major = r.U8();
-    h.metaVersion.minor = r.U8();
-    h.engineVersion.major = r.U8();
-    h.engineVersion.minor = r.U8();
-    h.engineVersion.build = r.U32();
-    if (!r.ok()) return 0;
-    *header_ = h;
-    return r.position();
-}
+    static void Dump(FILE* stream, const KtFrameHeader& h) {
+        std::fputs("MetaSignature = ", stream);
+        std::fwrite(h.metaSignature, 1, 4, stream);
+        std::fputs("\n", stream);
+        std::fprintf(stream, "MetaBytes = %d\n", static_cast<int>(h.metaBytes));
+        std::fprintf(stream, "MetaVersion  = %d.%d\n", h.metaVersion.major, h.metaVersion.minor);
+        std::fprintf(stream, "EngineVersion  = %d.%d.%08x\n", h.engineVersion.major, h.engineVersion.minor,
+                     static_cast<unsigned int>(h.engineVersion.build));
+    }
+};
 
-void KtFrameHeaderHandler::Dump(FILE* stream) const {
-    if (!readable_ || !stream) return;
-    std::fputs("MetaSignature = ", stream);
-    std::fwrite(readable_->metaSignature, 1, 4, stream);
-    std::fputs("\n", stream);
-    std::fprintf(stream, "MetaBytes = %d\n", static_cast<int>(readable_->metaBytes));
-    std::fprintf(stream, "MetaVersion  = %d.%d\n", readable_->metaVersion.major, readable_->metaVersion.minor);
-    std::fprintf(stream, "EngineVersion  = %d.%d.%08x\n", readable_->engineVersion.major,
-                 readable_->engineVersion.minor, static_cast<unsigned int>(readable_->engineVersion.build));
-}
+template class KtFixedRecordHandler<KtFrameHeader, 16>;
 
 namespace ktframe {
 

@@ -28,52 +28,37 @@ public:
     virtual void Dump(FILE* stream) const = 0;
 };
 
-class KtFrameHeaderHandler : public KtRwHandlerInterface {
+// Where a record's payload layout and dump text are stated; specialised
+// beside each fixed-size record's handler (see kt_fixed_record.h).
+template <class Record>
+struct KtRecordLayout;
+
+// A record whose payload is always kBytes bytes. Write and Read refuse a
+// buffer shorter than that and a payload whose fields do not fill exactly
+// kBytes; Read commits to the record only after a complete read.
+template <class Record, unsigned int kBytes>
+class KtFixedRecordHandler : public KtRwHandlerInterface {
 public:
-    static const unsigned int kSize = 16;
-    explicit KtFrameHeaderHandler(KtFrameHeader* header) : header_(header), readable_(header) {}
-    explicit KtFrameHeaderHandler(const KtFrameHeader* header) : header_(nullptr), readable_(header) {}
+    static constexpr unsigned int kSize = kBytes;
+    explicit KtFixedRecordHandler(Record* record) : record_(record), readable_(record) {}
+    explicit KtFixedRecordHandler(const Record* record) : record_(nullptr), readable_(record) {}
     unsigned int Size() const override { return kSize; }
     unsigned int Write(unsigned char* buffer, unsigned int length) const override;
     unsigned int Read(const unsigned char* buffer, unsigned int length) override;
     void Dump(FILE* stream) const override;
+    const Record* GetData() const { return readable_; }
 
 private:
-    KtFrameHeader* header_;
-    const KtFrameHeader* readable_;
+    Record* record_;
+    const Record* readable_;
 };
 
-class KtMetaSimilarityHandler : public KtRwHandlerInterface {
-public:
-    static const unsigned int kSize = 660;
-    explicit KtMetaSimilarityHandler(_KtMetaSimilarity* meta) : meta_(meta), readable_(meta) {}
-    explicit KtMetaSimilarityHandler(const _KtMetaSimilarity* meta) : meta_(nullptr), readable_(meta) {}
-    unsigned int Size() const override { return kSize; }
-    unsigned int Write(unsigned char* buffer, unsigned int length) const override;
-    unsigned int Read(const unsigned char* buffer, unsigned int length) override;
-    void Dump(FILE* stream) const override;
-    const _KtMetaSimilarity* GetData() const { return readable_; }
-
-private:
-    _KtMetaSimilarity* meta_;
-    const _KtMetaSimilarity* readable_;
-};
-
-class KtMetaColorLabelHandler : public KtRwHandlerInterface {
-public:
-    static const unsigned int kSize = 16;
-    explicit KtMetaColorLabelHandler(_KtMetaColorLabel* meta) : meta_(meta), readable_(meta) {}
-    explicit KtMetaColorLabelHandler(const _KtMetaColorLabel* meta) : meta_(nullptr), readable_(meta) {}
-    unsigned int Size() const override { return kSize; }
-    unsigned int Write(unsigned char* buffer, unsigned int length) const override;
-    unsigned int Read(const unsigned char* buffer, unsigned int length) override;
-    void Dump(FILE* stream) const override;
-    const _KtMetaColorLabel* GetData() const { return readable_; }
-
-private:
-    _KtMetaColorLabel* meta_;
-    const _KtMetaColorLabel* readable_;
-};
+using KtFrameHeaderHandler = KtFixedRecordHandler<KtFrameHeader, 16>;
+using KtMetaSimilarityHandler = KtFixedRecordHandler<_KtMetaSimilarity, 660>;
+using KtMetaColorLabelHandler = KtFixedRecordHandler<_KtMetaColorLabel, 16>;
+extern template class KtFixedRecordHandler<KtFrameHeader, 16>;
+extern template class KtFixedRecordHandler<_KtMetaSimilarity, 660>;
+extern template class KtFixedRecordHandler<_KtMetaColorLabel, 16>;
 
 // Meta version 2: six scores, analysed size, the finger outlines and the
 // blur map. Size is computed from the record; it is 0 when the record

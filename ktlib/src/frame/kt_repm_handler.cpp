@@ -1,13 +1,27 @@
 #include "ktlib/src/frame/kt_handlers.h"
 #include "ktlib/src/frame/kt_repm_record.h"
 
-#include "common/src/internal/byte_cursor.h"
+#include "ktlib/src/frame/kt_fixed_record.h"
+
 #include "common/src/internal/memory.h"
 
 namespace {
 
 const unsigned int kFingerFixedBytes = 12;  // score, area, numPoint
 const unsigned int kPointBytes = 4;         // x, y
+
+// The six scores and the analysed size open the payload.
+template <class Io, class Meta>
+void ScoreFields(Io& io, Meta& m) {
+    io.F32(m.colorVariation);
+    io.F32(m.badExposure);
+    io.F32(m.fingerOnLens);
+    io.F32(m.outOfFocus);
+    io.F32(m.cameraShake);
+    io.F32(m.motionBlur);
+    io.U32(m.analyzedWidth);
+    io.U32(m.analyzedHeight);
+}
 
 }  // namespace
 
@@ -39,14 +53,8 @@ unsigned int KtMetaRepresentativeHandler::Write(unsigned char* buffer, unsigned 
     if (size == 0 || !buffer || length < size) return 0;
     const _KtMetaRepresentative& m = *readable_;
     lmk::ByteWriter w(buffer, length);
-    w.F32(m.colorVariation);
-    w.F32(m.badExposure);
-    w.F32(m.fingerOnLens);
-    w.F32(m.outOfFocus);
-    w.F32(m.cameraShake);
-    w.F32(m.motionBlur);
-    w.U32(m.analyzedWidth);
-    w.U32(m.analyzedHeight);
+    ktframe::FieldWriter fields(w);
+    ScoreFields(fields, m);
     w.U32(m.numFinger);
     for (uint32_t i = 0; i < m.numFinger; ++i) {
         const _KtFinger& f = m.pFingers[i];
@@ -73,14 +81,8 @@ unsigned int KtMetaRepresentativeHandler::Read(const unsigned char* buffer, unsi
     _KtMetaRepresentative m = {};
     auto release = lmk::MakeScopeGuard([&m] { ktrepm::ReleaseArrays(&m); });
 
-    m.colorVariation = r.F32();
-    m.badExposure = r.F32();
-    m.fingerOnLens = r.F32();
-    m.outOfFocus = r.F32();
-    m.cameraShake = r.F32();
-    m.motionBlur = r.F32();
-    m.analyzedWidth = r.U32();
-    m.analyzedHeight = r.U32();
+    ktframe::FieldReader fields(r);
+    ScoreFields(fields, m);
     const uint32_t numFinger = r.U32();
     if (!r.ok() || numFinger > KT_MAX_FINGERS || !r.Has(kFingerFixedBytes * numFinger)) return 0;
 

@@ -31,6 +31,17 @@ int deepCopyRepm(const _KtMetaRepresentative& src, _KtMetaRepresentative& dst) {
     return ktrepm::DeepCopy(src, &dst);
 }
 
+// Parses one frame with a KtXxxParse function; on success the record is
+// handed to *owner, whose deleter releases it on every later path.
+template <class Meta, class Deleter>
+int ParseOwned(int (*parse)(const unsigned char*, unsigned int, KtFrameHeader*, Meta**), const uint8_t* data,
+               uint32_t length, KtFrameHeader* header, std::unique_ptr<Meta, Deleter>* owner) {
+    Meta* out = nullptr;
+    const int status = parse(data, length, header, &out);
+    if (status == KT_OK) owner->reset(out);
+    return status;
+}
+
 // A Kt call that ran out of memory is reported as such; any other failure
 // of a frame is a format error.
 uint32_t StatusOf(int ktStatus) {
@@ -170,10 +181,8 @@ _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersi
 
     std::unique_ptr<_KtMetaSimilarity, SimlDeleter> siml;
     {
-        _KtMetaSimilarity* out = nullptr;
-        const int status = KtSimlParse(pBuf, bufSize - consumed, &header, &out);
+        const int status = ParseOwned(KtSimlParse, pBuf + consumed, bufSize - consumed, &header, &siml);
         if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtSimlParse() failed");
-        siml.reset(out);
     }
     similarity = *siml;
     simlEngine = header.engineVersion;
@@ -182,10 +191,8 @@ _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersi
 
     std::unique_ptr<_KtMetaRepresentative, RepmDeleter> repm;
     {
-        _KtMetaRepresentative* out = nullptr;
-        const int status = KtRepmParse(pBuf + consumed, bufSize - consumed, &header, &out);
+        const int status = ParseOwned(KtRepmParse, pBuf + consumed, bufSize - consumed, &header, &repm);
         if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtRepmParse() failed");
-        repm.reset(out);
     }
     {
         const int status = deepCopyRepm(*repm, representative);
@@ -197,10 +204,8 @@ _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersi
 
     std::unique_ptr<_KtMetaColorLabel, ClblDeleter> clbl;
     {
-        _KtMetaColorLabel* out = nullptr;
-        const int status = KtClblParse(pBuf + consumed, bufSize - consumed, &header, &out);
+        const int status = ParseOwned(KtClblParse, pBuf + consumed, bufSize - consumed, &header, &clbl);
         if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtClblParse() failed");
-        clbl.reset(out);
     }
     colorLabel = *clbl;
     clblEngine = header.engineVersion;
