@@ -15,15 +15,15 @@
 namespace {
 
 // Kt records are released by their own dispose functions on every path.
-struct SimlDeleter {
-    void operator()(_KtMetaSimilarity* m) const { KtSimlDisposeMeta(&m); }
+void Dispose(_KtMetaSimilarity* m) { KtSimlDisposeMeta(&m); }
+void Dispose(_KtMetaRepresentative* m) { KtRepmDisposeMeta(&m); }
+void Dispose(_KtMetaColorLabel* m) { KtClblDisposeMeta(&m); }
+struct KtDeleter {
+    template <class Meta>
+    void operator()(Meta* m) const { Dispose(m); }
 };
-struct RepmDeleter {
-    void operator()(_KtMetaRepresentative* m) const { KtRepmDisposeMeta(&m); }
-};
-struct ClblDeleter {
-    void operator()(_KtMetaColorLabel* m) const { KtClblDisposeMeta(&m); }
-};
+template <class Meta>
+using KtPtr = std::unique_ptr<Meta, KtDeleter>;
 
 // Copies the representative record with arrays of its own: 0, 3 for a
 // record that cannot be copied, 4 out of memory (nothing left allocated).
@@ -31,21 +31,50 @@ int deepCopyRepm(const _KtMetaRepresentative& src, _KtMetaRepresentative& dst) {
     return ktrepm::DeepCopy(src, &dst);
 }
 
-// Parses one frame with a KtXxxParse function; on success the record is
-// handed to *owner, whose deleter releases it on every later path.
-template <class Meta, class Deleter>
-int ParseOwned(int (*parse)(const unsigned char*, unsigned int, KtFrameHeader*, Meta**), const uint8_t* data,
-               uint32_t length, KtFrameHeader* header, std::unique_ptr<Meta, Deleter>* owner) {
-    Meta* out = nullptr;
-    const int status = parse(data, length, header, &out);
-    if (status == KT_OK) owner->reset(out);
-    return status;
-}
-
 // A Kt call that ran out of memory is reported as such; any other failure
 // of a frame is a format error.
 uint32_t StatusOf(int ktStatus) {
     return ktStatus == KT_ERR_NO_MEMORY ? VOND_STATUS_OUT_OF_MEMORY : VOND_STATUS_FAILED;
+}
+
+// Copies a parsed record into the caller's: the flat records as they are,
+// the representative with arrays of its own (which can run out of memory).
+int CopyOut(const _KtMetaSimilarity& src, _KtMetaSimilarity& dst) {
+    dst = src;
+    return KT_OK;
+}
+int CopyOut(const _KtMetaRepresentative& src, _KtMetaRepresentative& dst) { return deepCopyRepm(src, dst); }
+int CopyOut(const _KtMetaColorLabel& src, _KtMetaColorLabel& dst) {
+    dst = src;
+    return KT_OK;
+}
+
+// Parses the frame at pBuf + consumed, given the bytes up to the end of the
+// buffer, into the caller's record, then takes its versions and steps past
+// it (a frame is its 16-byte header plus exactly metaBytes of payload). On
+// failure *result names the call that failed and nothing else is changed.
+template <class Meta>
+bool ParseFrame(int (*parse)(const unsigned char*, unsigned int, KtFrameHeader*, Meta**), const char* parseFailed,
+                const uint8_t* pBuf, uint32_t bufSize, uint32_t& consumed, _KtEngineVersion& engine,
+                _KtMetaVersion& meta, Meta& record, _VondResult* result) {
+    KtFrameHeader header;
+    Meta* out = nullptr;
+    int status = parse(pBuf + consumed, bufSize - consumed, &header, &out);
+    if (status != KT_OK) {
+        *result = vond::Fail(*result, StatusOf(status), parseFailed);
+        return false;
+    }
+    const KtPtr<Meta> parsed(out);
+    status = CopyOut(*parsed, record);
+    if (status != KT_OK) {
+        // Only the representative's deep copy can fail.
+        *result = vond::Fail(*result, StatusOf(status), "deepCopyRepm() failed");
+        return false;
+    }
+    engine = header.engineVersion;
+    meta = header.metaVersion;
+    consumed += 16 + header.metaBytes;
+    return true;
 }
 
 bool QualitySizes(const _KtMetaRepresentative& representative, uint32_t* simlSize, uint32_t* repmSize,
@@ -90,7 +119,7 @@ _VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEng
     // Format 0: RGB, as the working image is.
     if (KtSimlGetVersion(&simlMeta, &simlEngine) != KT_OK)
         return vond::Fail(result, VOND_STATUS_FAILED, "KtSimlGetVersion() failed");
-    std::unique_ptr<_KtMetaSimilarity, SimlDeleter> siml;
+    KtPtr<_KtMetaSimilarity> siml;
     {
         _KtMetaSimilarity* out = nullptr;
         const int status = KtSimlExtract(small->pData, static_cast<unsigned int>(small->width),
@@ -102,7 +131,7 @@ _VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEng
 
     if (KtRepmGetVersion(&repmMeta, &repmEngine) != KT_OK)
         return vond::Fail(result, VOND_STATUS_FAILED, "KtRepmGetVersion() failed");
-    std::unique_ptr<_KtMetaRepresentative, RepmDeleter> repm;
+    KtPtr<_KtMetaRepresentative> repm;
     {
         _KtMetaRepresentative* out = nullptr;
         const int status = KtRepmExtract(pImage->pData, static_cast<unsigned int>(pImage->width),
@@ -119,7 +148,7 @@ _VondResult VondKtLibAnalyze(const _zbm_Image* pImage, _KtEngineVersion& simlEng
 
     if (KtClblGetVersion(&clblMeta, &clblEngine) != KT_OK)
         return vond::Fail(result, VOND_STATUS_FAILED, "KtClblGetVersion() failed");
-    std::unique_ptr<_KtMetaColorLabel, ClblDeleter> clbl;
+    KtPtr<_KtMetaColorLabel> clbl;
     {
         _KtMetaColorLabel* out = nullptr;
         const int status = KtClblExtract(siml.get(), &out);
@@ -175,43 +204,14 @@ _VondResult VondKtLibParse(const uint8_t* pBuf, uint32_t bufSize, _KtEngineVersi
     consumed = 0;
     // Whatever was copied into the caller's records is released on failure.
     auto release = lmk::MakeScopeGuard([&] { VondKtlibDisposeMeta(similarity, representative, colorLabel); });
-    // A parsed frame is its 16-byte header plus exactly metaBytes of payload,
-    // and each frame's parser is given the bytes up to the end of the buffer.
-    KtFrameHeader header;
-
-    std::unique_ptr<_KtMetaSimilarity, SimlDeleter> siml;
-    {
-        const int status = ParseOwned(KtSimlParse, pBuf + consumed, bufSize - consumed, &header, &siml);
-        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtSimlParse() failed");
+    if (!ParseFrame(KtSimlParse, "KtSimlParse() failed", pBuf, bufSize, consumed, simlEngine, simlMeta, similarity,
+                    &result) ||
+        !ParseFrame(KtRepmParse, "KtRepmParse() failed", pBuf, bufSize, consumed, repmEngine, repmMeta,
+                    representative, &result) ||
+        !ParseFrame(KtClblParse, "KtClblParse() failed", pBuf, bufSize, consumed, clblEngine, clblMeta, colorLabel,
+                    &result)) {
+        return result;
     }
-    similarity = *siml;
-    simlEngine = header.engineVersion;
-    simlMeta = header.metaVersion;
-    consumed += 16 + header.metaBytes;
-
-    std::unique_ptr<_KtMetaRepresentative, RepmDeleter> repm;
-    {
-        const int status = ParseOwned(KtRepmParse, pBuf + consumed, bufSize - consumed, &header, &repm);
-        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtRepmParse() failed");
-    }
-    {
-        const int status = deepCopyRepm(*repm, representative);
-        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "deepCopyRepm() failed");
-    }
-    repmEngine = header.engineVersion;
-    repmMeta = header.metaVersion;
-    consumed += 16 + header.metaBytes;
-
-    std::unique_ptr<_KtMetaColorLabel, ClblDeleter> clbl;
-    {
-        const int status = ParseOwned(KtClblParse, pBuf + consumed, bufSize - consumed, &header, &clbl);
-        if (status != KT_OK) return vond::Fail(result, StatusOf(status), "KtClblParse() failed");
-    }
-    colorLabel = *clbl;
-    clblEngine = header.engineVersion;
-    clblMeta = header.metaVersion;
-    consumed += 16 + header.metaBytes;
-
     release.Dismiss();
     return result;
 }
