@@ -39,15 +39,12 @@ uint32_t StatusOf(int ktStatus) {
 
 // Copies a parsed record into the caller's: the flat records as they are,
 // the representative with arrays of its own (which can run out of memory).
-int CopyOut(const _KtMetaSimilarity& src, _KtMetaSimilarity& dst) {
+template <class Flat>
+int CopyOut(const Flat& src, Flat& dst) {
     dst = src;
     return KT_OK;
 }
 int CopyOut(const _KtMetaRepresentative& src, _KtMetaRepresentative& dst) { return deepCopyRepm(src, dst); }
-int CopyOut(const _KtMetaColorLabel& src, _KtMetaColorLabel& dst) {
-    dst = src;
-    return KT_OK;
-}
 
 // Parses the frame at pBuf + consumed, given the bytes up to the end of the
 // buffer, into the caller's record, then takes its versions and steps past
