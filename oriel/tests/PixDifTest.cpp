@@ -3,6 +3,7 @@
 // stabilisation and the scan of whole images.
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -104,6 +105,35 @@ TEST(PixDifTest, TreeDescentWithMargins) {
     EXPECT_EQ(det.GetEndThreshold(0), 1);
     EXPECT_EQ(det.Label2NodeID(1), 0);
     EXPECT_EQ(det.Label2NodeID(2), -1);
+}
+
+// Pose labels: 15 head directions times 5 rolls; other labels (they come
+// from dictionary files) have no angles.
+TEST(PixDifTest, PoseLabelAngles) {
+    const float deg = 3.1415927f / 180.0f;
+    struct Case {
+        int32_t label;
+        float roll, pitch, yaw;
+    };
+    const Case cases[] = {
+        {1, 0, 0, 0},
+        {2, 0, 0, 47.5f * 0.763f * deg},
+        {5, 0, 55 * 1.75f * deg, 0},
+        {16, 20 * deg, 0, 0},
+        {75, -40 * deg, 55 * 1.75f * deg, -77.5f * deg},
+        {0, 0, 0, 0},
+        {76, 0, 0, 0},
+        {-1, 0, 0, 0},
+        {INT32_MIN, 0, 0, 0},
+        {INT32_MAX, 0, 0, 0},
+    };
+    for (const Case& c : cases) {
+        float r = 1, p = 1, y = 1;
+        Label2FaceAngle4HeadDirectionCalc(c.label, &r, &p, &y);
+        EXPECT_FLOAT_EQ(r, c.roll) << c.label;
+        EXPECT_FLOAT_EQ(p, c.pitch) << c.label;
+        EXPECT_FLOAT_EQ(y, c.yaw) << c.label;
+    }
 }
 
 TEST(PixDifTest, ValidationRefusesBrokenTrees) {

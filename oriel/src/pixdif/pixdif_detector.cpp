@@ -82,7 +82,9 @@ void Label2FaceAngle4HeadDirectionCalc(int32_t label, float* roll, float* pitch,
     static const float kRollAmp = 1.0f;
     const float toRad = 3.1415927f / 180.0f;
     float r = 0, p = 0, y = 0;
-    const int32_t i = label - 1;
+    // Labels come from dictionary files: anything outside 1..75 has no angles
+    // (and label - 1 must not overflow for the smallest label).
+    const int32_t i = label >= 1 ? label - 1 : -1;
     const int32_t rollIndex = static_cast<int32_t>(static_cast<float>(i) / 15.0f);
     if (i >= 0 && rollIndex < 5) {
         y = kAngles[i % 15][0] * kAmp[i % 15][0] * toRad;
