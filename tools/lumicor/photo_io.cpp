@@ -2,6 +2,7 @@
 
 #include <csetjmp>
 #include <cstdio>  // before jpeglib.h, which uses FILE
+#include <cstdlib>
 #include <cstring>
 
 #include <jerror.h>
@@ -236,6 +237,34 @@ bool DecodePhoto(const std::vector<uint8_t>& bytes, Photo* photo, std::string* e
     }
     *error = "unsupported format (not JPEG or PNG)";
     return false;
+}
+
+std::vector<uint8_t> EncodeJpeg(const uint8_t* rgb, int width, int height, int stride, int quality,
+                                const std::vector<uint8_t>& app1) {
+    jpeg_compress_struct cinfo;
+    jpeg_error_mgr err;
+    cinfo.err = jpeg_std_error(&err);
+    jpeg_create_compress(&cinfo);
+    unsigned char* buffer = nullptr;
+    unsigned long size = 0;
+    jpeg_mem_dest(&cinfo, &buffer, &size);
+    cinfo.image_width = static_cast<JDIMENSION>(width);
+    cinfo.image_height = static_cast<JDIMENSION>(height);
+    cinfo.input_components = 3;
+    cinfo.in_color_space = JCS_RGB;
+    jpeg_set_defaults(&cinfo);
+    jpeg_set_quality(&cinfo, quality, TRUE);
+    jpeg_start_compress(&cinfo, TRUE);
+    if (!app1.empty()) jpeg_write_marker(&cinfo, JPEG_APP0 + 1, app1.data(), static_cast<unsigned int>(app1.size()));
+    while (cinfo.next_scanline < cinfo.image_height) {
+        JSAMPROW row = const_cast<JSAMPROW>(rgb + static_cast<size_t>(cinfo.next_scanline) * static_cast<size_t>(stride));
+        jpeg_write_scanlines(&cinfo, &row, 1);
+    }
+    jpeg_finish_compress(&cinfo);
+    std::vector<uint8_t> bytes(buffer, buffer + size);
+    jpeg_destroy_compress(&cinfo);
+    std::free(buffer);
+    return bytes;
 }
 
 bool WritePng(const std::string& path, const _zbm_Image* image, std::string* error) {

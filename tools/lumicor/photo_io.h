@@ -39,6 +39,12 @@ bool DecodePhoto(const std::vector<uint8_t>& bytes, Photo* photo, std::string* e
 // or it is unreadable.
 int ReadExifOrientation(const uint8_t* exif, size_t size);
 
+// An in-memory JPEG of packed RGB rows (`stride` bytes apart) at `quality`
+// (1..100); `app1`, when not empty, is written as an APP1 marker (an EXIF
+// block). Used by the tests and by siml_rank's re-encoded copies.
+std::vector<uint8_t> EncodeJpeg(const uint8_t* rgb, int width, int height, int stride, int quality,
+                                const std::vector<uint8_t>& app1 = {});
+
 // Writes an RGB (or gray) image as an 8-bit PNG file.
 bool WritePng(const std::string& path, const _zbm_Image* image, std::string* error);
 

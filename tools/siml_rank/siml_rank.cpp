@@ -12,9 +12,6 @@
 // 1 when one does not. Exits with 77 when FOLDER holds no JPEG photo.
 #include <dirent.h>
 
-#include <cstdio>  // before jpeglib.h, which uses FILE
-
-#include <jpeglib.h>
 #include <lumicor/ktlib.h>
 #include <lumicor/ktsimilarity.h>
 #include <lumicor/zbm_image.h>
@@ -23,6 +20,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <string>
@@ -48,32 +46,6 @@ bool DecodeJpeg(const std::vector<uint8_t>& bytes, Rgb* out, std::string* error)
         std::memcpy(&out->pixels[static_cast<size_t>(y) * im->width * 3], im->pData + static_cast<size_t>(y) * im->pitch,
                     static_cast<size_t>(im->width) * 3);
     return true;
-}
-
-std::vector<uint8_t> EncodeJpeg(const Rgb& image, int quality) {
-    jpeg_compress_struct cinfo;
-    jpeg_error_mgr err;
-    cinfo.err = jpeg_std_error(&err);
-    jpeg_create_compress(&cinfo);
-    unsigned char* buffer = nullptr;
-    unsigned long size = 0;
-    jpeg_mem_dest(&cinfo, &buffer, &size);
-    cinfo.image_width = static_cast<JDIMENSION>(image.width);
-    cinfo.image_height = static_cast<JDIMENSION>(image.height);
-    cinfo.input_components = 3;
-    cinfo.in_color_space = JCS_RGB;
-    jpeg_set_defaults(&cinfo);
-    jpeg_set_quality(&cinfo, quality, TRUE);
-    jpeg_start_compress(&cinfo, TRUE);
-    while (cinfo.next_scanline < cinfo.image_height) {
-        JSAMPROW row = const_cast<JSAMPROW>(&image.pixels[static_cast<size_t>(cinfo.next_scanline) * image.width * 3]);
-        jpeg_write_scanlines(&cinfo, &row, 1);
-    }
-    jpeg_finish_compress(&cinfo);
-    std::vector<uint8_t> bytes(buffer, buffer + size);
-    jpeg_destroy_compress(&cinfo);
-    std::free(buffer);
-    return bytes;
 }
 
 // Resizes with the library's own resize (the one the analysis uses).
@@ -191,7 +163,8 @@ int main(int argc, char** argv) {
             return 2;
         }
         Rgb copies[4];
-        if (!DecodeJpeg(EncodeJpeg(photo, 50), &copies[0], &error)) {
+        if (!DecodeJpeg(lumicor_tool::EncodeJpeg(photo.pixels.data(), photo.width, photo.height, photo.width * 3, 50),
+                        &copies[0], &error)) {
             std::printf("siml_rank: %s re-encoded: %s\n", files[i].c_str(), error.c_str());
             return 2;
         }

@@ -1,11 +1,12 @@
 #include "tool_test_files.h"
 
-#include <cstdio>  // before jpeglib.h
+#include "photo_io.h"
+
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
 #include <gtest/gtest.h>
-#include <jpeglib.h>
 #include <png.h>
 
 namespace lumicor_tool_test {
@@ -39,33 +40,8 @@ std::vector<uint8_t> ExifOrientation(int orientation) {
 }  // namespace
 
 std::vector<uint8_t> EncodeJpeg(const Rgb& image, int orientation) {
-    jpeg_compress_struct cinfo;
-    jpeg_error_mgr err;
-    cinfo.err = jpeg_std_error(&err);
-    jpeg_create_compress(&cinfo);
-    unsigned char* buffer = nullptr;
-    unsigned long size = 0;
-    jpeg_mem_dest(&cinfo, &buffer, &size);
-    cinfo.image_width = static_cast<JDIMENSION>(image.width);
-    cinfo.image_height = static_cast<JDIMENSION>(image.height);
-    cinfo.input_components = 3;
-    cinfo.in_color_space = JCS_RGB;
-    jpeg_set_defaults(&cinfo);
-    jpeg_set_quality(&cinfo, 95, TRUE);
-    jpeg_start_compress(&cinfo, TRUE);
-    if (orientation != 0) {
-        const std::vector<uint8_t> exif = ExifOrientation(orientation);
-        jpeg_write_marker(&cinfo, JPEG_APP0 + 1, exif.data(), static_cast<unsigned int>(exif.size()));
-    }
-    while (cinfo.next_scanline < cinfo.image_height) {
-        JSAMPROW row = const_cast<JSAMPROW>(image.At(0, static_cast<int>(cinfo.next_scanline)));
-        jpeg_write_scanlines(&cinfo, &row, 1);
-    }
-    jpeg_finish_compress(&cinfo);
-    std::vector<uint8_t> bytes(buffer, buffer + size);
-    jpeg_destroy_compress(&cinfo);
-    std::free(buffer);
-    return bytes;
+    return lumicor_tool::EncodeJpeg(image.pixels.data(), image.width, image.height, image.width * 3, 95,
+                                    orientation != 0 ? ExifOrientation(orientation) : std::vector<uint8_t>());
 }
 
 std::vector<uint8_t> EncodePng(const Rgb& image, bool transparentFirst) {
