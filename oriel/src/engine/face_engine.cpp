@@ -276,25 +276,7 @@ bool FaceEngine::Detect(const nn::ImageView& img, const Oriel_searchArea* areas,
         if (w <= 0.0 || h <= 0.0 || (w < h ? w : h) < minSide) continue;
         dets[kept++] = dets[i];
     }
-    if (kept == 0) return true;
-    Oriel_areaInfo* faces = static_cast<Oriel_areaInfo*>(std::malloc(kept * sizeof(Oriel_areaInfo)));
-    if (!faces) return false;
-    for (size_t i = 0; i < kept; ++i) {
-        ResetAreaInfo(&faces[i]);
-        faces[i].x = dets[i].x;
-        faces[i].y = dets[i].y;
-        faces[i].width = dets[i].w;
-        faces[i].height = dets[i].h;
-        faces[i].score = dets[i].score;
-        faces[i].tag = static_cast<int32_t>(i);
-    }
-    if (!Complete(img, faces, static_cast<uint32_t>(kept))) {
-        std::free(faces);
-        return false;
-    }
-    out->count = static_cast<uint32_t>(kept);
-    out->pInfo = faces;
-    return true;
+    return Publish(img, dets.get(), static_cast<uint32_t>(kept), out);
 }
 
 bool FaceEngine::DetectLocal(const nn::ImageView& img, const Oriel_areaInfo* cand, uint32_t n,
@@ -342,23 +324,27 @@ bool FaceEngine::DetectLocal(const nn::ImageView& img, const Oriel_areaInfo* can
         }
         if (!duplicate) found[nFound++] = d;
     }
-    if (nFound == 0) return true;
-    Oriel_areaInfo* faces = static_cast<Oriel_areaInfo*>(std::malloc(nFound * sizeof(Oriel_areaInfo)));
+    return Publish(img, found.get(), nFound, out);
+}
+
+bool FaceEngine::Publish(const nn::ImageView& img, const Detection* dets, uint32_t n, Oriel_faceAreaArray* out) {
+    if (n == 0) return true;
+    Oriel_areaInfo* faces = static_cast<Oriel_areaInfo*>(std::malloc(n * sizeof(Oriel_areaInfo)));
     if (!faces) return false;
-    for (uint32_t i = 0; i < nFound; ++i) {
+    for (uint32_t i = 0; i < n; ++i) {
         ResetAreaInfo(&faces[i]);
-        faces[i].x = found[i].x;
-        faces[i].y = found[i].y;
-        faces[i].width = found[i].w;
-        faces[i].height = found[i].h;
-        faces[i].score = found[i].score;
+        faces[i].x = dets[i].x;
+        faces[i].y = dets[i].y;
+        faces[i].width = dets[i].w;
+        faces[i].height = dets[i].h;
+        faces[i].score = dets[i].score;
         faces[i].tag = static_cast<int32_t>(i);
     }
-    if (!Complete(img, faces, nFound)) {
+    if (!Complete(img, faces, n)) {
         std::free(faces);
         return false;
     }
-    out->count = nFound;
+    out->count = n;
     out->pInfo = faces;
     return true;
 }

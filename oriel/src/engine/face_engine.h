@@ -82,6 +82,9 @@ private:
     // the threshold: each is searched again at a higher resolution and
     // kept (with the better box) only when confirmed.
     bool Verify(const nn::ImageView& img, Detection* dets, size_t* n);
+    // The first n detections as a malloc'd face array in *out (left alone
+    // when n is 0), completed as the mode asks.
+    bool Publish(const nn::ImageView& img, const Detection* dets, uint32_t n, Oriel_faceAreaArray* out);
     // Fills the remaining fields of detected faces as the mode asks.
     bool Complete(const nn::ImageView& img, Oriel_areaInfo* faces, uint32_t n);
 
