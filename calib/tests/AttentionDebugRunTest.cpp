@@ -3,7 +3,6 @@
 // its attention areas drawn. The files go to $LUMICOR_ATTENTION_DEBUG_DIR
 // when it is set (and are kept), else to a temporary directory.
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <cstdlib>
 #include <string>
@@ -39,14 +38,14 @@ TEST(AttentionDebugRunTest, WritesMapsAndAnnotatedPhoto) {
     MIPlane* plane = ca.CreateMIPlane(image640.get());
     ASSERT_NE(plane, nullptr);
     VAArrange list;
-    // Detect writes "param.txt" into the working directory: keep it with the other files.
-    char cwd[4096];
-    ASSERT_NE(getcwd(cwd, sizeof cwd), nullptr);
-    ASSERT_EQ(chdir(dir.c_str()), 0);
-    testing::internal::CaptureStdout();
-    const uint32_t detected = ca.Detect(plane, nullptr, &list);
-    testing::internal::GetCapturedStdout();
-    ASSERT_EQ(chdir(cwd), 0);
+    uint32_t detected;
+    {
+        // Detect writes "param.txt" into the working directory: keep it with the other files.
+        lumicor::test::WorkingDirectory in(dir);
+        testing::internal::CaptureStdout();
+        detected = ca.Detect(plane, nullptr, &list);
+        testing::internal::GetCapturedStdout();
+    }
     ca.DisposeMIPlane(&plane);
     ASSERT_EQ(detected, 0u);
     ZbmImagePtr image40(ca.CreateShrinkImage(source.get(), 40));

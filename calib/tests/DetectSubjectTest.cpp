@@ -306,9 +306,7 @@ TEST(DetectSubjectTest, AllocationFailuresOnFacePath) {
 
 TEST(DetectSubjectTest, DebugOutputWritesParameterFileAndSaliency) {
     lumicor::test::TempDir dir;
-    char cwd[4096];
-    ASSERT_NE(getcwd(cwd, sizeof cwd), nullptr);
-    ASSERT_EQ(chdir(dir.path().c_str()), 0);
+    lumicor::test::WorkingDirectory in(dir.path());  // "param.txt" goes to the working directory
     CAinterface ca;
     ca.debugOutput = 1;
     std::strcpy(ca.outputDir, "run");
@@ -329,7 +327,6 @@ TEST(DetectSubjectTest, DebugOutputWritesParameterFileAndSaliency) {
     EXPECT_EQ(testing::internal::GetCapturedStderr(), "No write file: param.txt\n");
     rmdir("param.txt");
     ca.DisposeMIPlane(&plane);
-    ASSERT_EQ(chdir(cwd), 0);
 
     EXPECT_EQ(text.rfind(std::string(67, '#') + "\n#   Parameter for Visual Attention \n", 0), 0u);
     EXPECT_NE(text.find("\n#" + std::string(66, '=') + "\n# face parameters\n#" + std::string(66, '=') + "\n"),

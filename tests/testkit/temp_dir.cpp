@@ -45,6 +45,23 @@ std::string TempDir::Write(const std::string& name, const std::string& bytes) co
     return p;
 }
 
+WorkingDirectory::WorkingDirectory(const std::string& path) {
+    char cwd[4096];
+    if (getcwd(cwd, sizeof cwd) == nullptr) {
+        ADD_FAILURE() << "getcwd failed";
+        return;
+    }
+    if (chdir(path.c_str()) != 0) {
+        ADD_FAILURE() << "cannot change to " << path;
+        return;
+    }
+    previous_ = cwd;
+}
+
+WorkingDirectory::~WorkingDirectory() {
+    if (!previous_.empty() && chdir(previous_.c_str()) != 0) ADD_FAILURE() << "cannot return to " << previous_;
+}
+
 std::string ReadFileBytes(const std::string& path) {
     std::ifstream in(path, std::ios::binary);
     std::ostringstream s;

@@ -27,6 +27,20 @@ private:
     std::string path_;
 };
 
+// Makes `path` the working directory for the object's lifetime and returns to
+// the previous one afterwards, also when an assertion ends the test early. The
+// test fails (ADD_FAILURE) when either change does not work.
+class WorkingDirectory {
+public:
+    explicit WorkingDirectory(const std::string& path);
+    ~WorkingDirectory();
+    WorkingDirectory(const WorkingDirectory&) = delete;
+    WorkingDirectory& operator=(const WorkingDirectory&) = delete;
+
+private:
+    std::string previous_;
+};
+
 // The whole contents of a file, or an empty string when it cannot be read.
 std::string ReadFileBytes(const std::string& path);
 bool FileExists(const std::string& path);
